@@ -1,0 +1,47 @@
+// Host implementations of the libcutils property readers that Debian's libcutils declares but
+// does not ship. Properties come from the file named by VYR_PROPERTY_FILE.
+
+#include <cutils/properties.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <optional>
+#include <string>
+
+#include "property_file.h"
+
+namespace {
+
+constexpr char kPropertyFileVariable[] = "VYR_PROPERTY_FILE";
+
+std::optional<std::string> ReadProperty(const char* key) {
+    if (key == nullptr) return std::nullopt;
+    const char* path = getenv(kPropertyFileVariable);
+    if (path == nullptr || *path == '\0') return std::nullopt;
+    return host_properties::LookUp(path, key);
+}
+
+}  // namespace
+
+extern "C" int property_get(const char* key, char* value, const char* default_value) {
+    std::optional<std::string> found = ReadProperty(key);
+    std::string text;
+    if (found && !found->empty()) {
+        text = *found;
+    } else if (default_value != nullptr) {
+        text = default_value;
+    }
+    // The platform never stores longer values; keep callers' PROPERTY_VALUE_MAX buffers safe.
+    if (text.size() > PROPERTY_VALUE_MAX - 1) text.resize(PROPERTY_VALUE_MAX - 1);
+    memcpy(value, text.c_str(), text.size() + 1);
+    return static_cast<int>(text.size());
+}
+
+extern "C" int8_t property_get_bool(const char* key, int8_t default_value) {
+    std::optional<std::string> found = ReadProperty(key);
+    if (!found) return default_value;
+    const std::string& v = *found;
+    if (v == "1" || v == "y" || v == "yes" || v == "on" || v == "true") return 1;
+    if (v == "0" || v == "n" || v == "no" || v == "off" || v == "false") return 0;
+    return default_value;
+}
