@@ -1,0 +1,354 @@
+// The real vyrservice binary in a process of its own, reached over the host binder runtime.
+
+#include <aidl/android/vyr/BnEventCallback.h>
+#include <aidl/android/vyr/IVYRService.h>
+#include <android/binder_manager.h>
+#include <android/binder_process.h>
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <spawn.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <iostream>
+#include <sstream>
+#include <string>
+#include <thread>
+#include <vector>
+
+extern char** environ;
+
+namespace {
+
+using aidl::android::vyr::Event;
+using aidl::android::vyr::IEventCallback;
+using aidl::android::vyr::IVYRService;
+using namespace std::chrono_literals;
+
+constexpr char kServiceName[] = "vyrservice";
+constexpr char kCallbackClientFlag[] = "--callback-client";
+
+std::string g_self;
+std::string g_work_dir;
+
+std::string MakeTempDir() {
+    char dir[] = "/tmp/vyr-service-process-XXXXXX";
+    return mkdtemp(dir);
+}
+
+std::string ReadFile(const std::string& path) {
+    std::ifstream in(path);
+    std::stringstream text;
+    text << in.rdbuf();
+    return text.str();
+}
+
+// A child process, killed (SIGTERM, then SIGKILL) and reaped when the object goes.
+class Child {
+  public:
+    Child(const std::vector<std::string>& argv, const std::vector<std::string>& extra_env,
+          const std::string& output_path, int stdout_fd = -1, int stdin_fd = -1) {
+        std::vector<std::string> env_text(extra_env);
+        for (char** e = environ; *e != nullptr; ++e) {
+            const std::string entry(*e);
+            const std::string key = entry.substr(0, entry.find('='));
+            bool overridden = false;
+            for (const auto& extra : extra_env) {
+                if (extra.compare(0, key.size() + 1, key + "=") == 0) overridden = true;
+            }
+            if (!overridden) env_text.push_back(entry);
+        }
+        std::vector<char*> args;
+        for (const auto& a : argv) args.push_back(const_cast<char*>(a.c_str()));
+        args.push_back(nullptr);
+        std::vector<char*> env;
+        for (const auto& e : env_text) env.push_back(const_cast<char*>(e.c_str()));
+        env.push_back(nullptr);
+
+        posix_spawn_file_actions_t actions;
+        posix_spawn_file_actions_init(&actions);
+        posix_spawn_file_actions_addopen(&actions, 2, output_path.c_str(),
+                                         O_WRONLY | O_CREAT | O_TRUNC, 0600);
+        if (stdout_fd >= 0) {
+            posix_spawn_file_actions_adddup2(&actions, stdout_fd, 1);
+        } else {
+            posix_spawn_file_actions_adddup2(&actions, 2, 1);
+        }
+        if (stdin_fd >= 0) posix_spawn_file_actions_adddup2(&actions, stdin_fd, 0);
+        start_ = std::chrono::steady_clock::now();
+        if (posix_spawn(&pid_, args[0], &actions, nullptr, args.data(), env.data()) != 0) {
+            pid_ = -1;
+        }
+        posix_spawn_file_actions_destroy(&actions);
+    }
+
+    ~Child() { Stop(); }
+
+    pid_t pid() const { return pid_; }
+    std::chrono::steady_clock::time_point start() const { return start_; }
+
+    bool Running() {
+        if (pid_ <= 0) return false;
+        int status = 0;
+        const pid_t r = waitpid(pid_, &status, WNOHANG);
+        if (r == pid_) {
+            pid_ = -1;
+            status_ = status;
+            return false;
+        }
+        return r == 0;
+    }
+
+    // Sends `signal` and reaps the child; SIGKILL after 5 s.
+    void Stop(int signal = SIGTERM) {
+        if (pid_ <= 0) return;
+        kill(pid_, signal);
+        const auto deadline = std::chrono::steady_clock::now() + 5s;
+        while (Running() && std::chrono::steady_clock::now() < deadline) {
+            std::this_thread::sleep_for(10ms);
+        }
+        if (pid_ > 0) {
+            kill(pid_, SIGKILL);
+            int status = 0;
+            waitpid(pid_, &status, 0);
+            status_ = status;
+            pid_ = -1;
+        }
+    }
+
+  private:
+    pid_t pid_ = -1;
+    int status_ = 0;
+    std::chrono::steady_clock::time_point start_;
+};
+
+std::vector<std::string> ServiceEnv(const std::string& dir, const std::string& binder_dir) {
+    const std::string properties = dir + "/build.prop";
+    std::ofstream(properties) << "persist.vendor.camera.vyr_supported=true\n"
+                              << "persist.vendor.camera.vyr_range_supported=1\n";
+    return {"VYR_BINDER_DIR=" + binder_dir, "VYR_PROPERTY_FILE=" + properties};
+}
+
+ndk::SpAIBinder WaitForRegistration(std::chrono::milliseconds timeout) {
+    const auto deadline = std::chrono::steady_clock::now() + timeout;
+    while (std::chrono::steady_clock::now() < deadline) {
+        ndk::SpAIBinder binder(AServiceManager_checkService(kServiceName));
+        if (binder.get() != nullptr && AIBinder_isAlive(binder.get())) return binder;
+        std::this_thread::sleep_for(10ms);
+    }
+    return ndk::SpAIBinder();
+}
+
+class ServiceProcessTest : public ::testing::Test {
+  protected:
+    void SetUp() override {
+        dir_ = MakeTempDir();
+        // A service of an earlier test in this process must be gone from the registry.
+        const auto deadline = std::chrono::steady_clock::now() + 5s;
+        while (std::chrono::steady_clock::now() < deadline) {
+            ndk::SpAIBinder stale(AServiceManager_checkService(kServiceName));
+            if (stale.get() == nullptr || !AIBinder_isAlive(stale.get())) break;
+            std::this_thread::sleep_for(10ms);
+        }
+    }
+    void TearDown() override {
+        service_.reset();
+        if (HasFailure()) {
+            std::cerr << "service output:\n" << ReadFile(dir_ + "/service.log");
+        }
+        std::filesystem::remove_all(dir_);
+    }
+
+    std::unique_ptr<Child> StartService() {
+        return std::make_unique<Child>(std::vector<std::string>{VYRSERVICE_BINARY},
+                                       ServiceEnv(dir_, g_work_dir + "/binder"),
+                                       dir_ + "/service.log");
+    }
+
+    std::string dir_;
+    std::shared_ptr<IVYRService> service_;
+};
+
+TEST_F(ServiceProcessTest, RegistersNoSoonerThanFourSecondsAfterStartAndServes) {
+    auto process = StartService();
+    ASSERT_GT(process->pid(), 0);
+    ndk::SpAIBinder binder = WaitForRegistration(30s);
+    ASSERT_NE(nullptr, binder.get()) << "vyrservice never registered";
+    EXPECT_GE(std::chrono::steady_clock::now() - process->start(), 4s);
+    service_ = IVYRService::fromBinder(binder);
+    ASSERT_NE(nullptr, service_);
+
+    // A fresh process draws its handles from the unseeded generator: the first draw is the
+    // service's own display handle, the second the first client's.
+    srand(1);
+    const int32_t display_handle = rand() + 1;
+    const int32_t first_client = rand() + 1;
+
+    std::vector<int32_t> handles;
+    for (int i = 0; i < 10; ++i) {
+        int32_t handle = 0;
+        ASSERT_TRUE(service_->Open(i % 2 == 0 ? 1 : 3, &handle).isOk());
+        EXPECT_GT(handle, 0);
+        EXPECT_NE(display_handle, handle);
+        handles.push_back(handle);
+    }
+    EXPECT_EQ(first_client, handles[0]);
+    int32_t result = 0;
+    ASSERT_TRUE(service_->Open(3, &result).isOk());
+    EXPECT_EQ(-1, result);
+    ASSERT_TRUE(service_->Open(2, &result).isOk());
+    EXPECT_EQ(-22, result);
+
+    for (int32_t handle : {handles[0], handles[1]}) {
+        ASSERT_TRUE(service_->Enable(handle, 100, &result).isOk());
+        EXPECT_EQ(0, result);
+        ASSERT_TRUE(service_->Enable(handle, 100, &result).isOk());
+        EXPECT_EQ(-17, result);
+    }
+    for (int32_t handle : {handles[0], handles[1]}) {
+        EXPECT_TRUE(service_->Disable(handle).isOk());
+    }
+    for (int32_t handle : handles) {
+        EXPECT_TRUE(service_->Close(handle).isOk());
+    }
+    ASSERT_TRUE(service_->Enable(handles[0], 100, &result).isOk());
+    EXPECT_EQ(-38, result);
+    ASSERT_TRUE(service_->Open(3, &result).isOk());
+    EXPECT_GT(result, 0);
+    EXPECT_TRUE(service_->Close(result).isOk());
+    EXPECT_TRUE(process->Running());
+}
+
+TEST_F(ServiceProcessTest, DeadCallbackClientIsDisabledAndClosed) {
+    auto process = StartService();
+    ndk::SpAIBinder binder = WaitForRegistration(30s);
+    ASSERT_NE(nullptr, binder.get()) << "vyrservice never registered";
+    service_ = IVYRService::fromBinder(binder);
+
+    int to_test[2];
+    int to_client[2];
+    ASSERT_EQ(0, pipe2(to_test, O_CLOEXEC));
+    ASSERT_EQ(0, pipe2(to_client, O_CLOEXEC));
+    auto client = std::make_unique<Child>(
+        std::vector<std::string>{g_self, kCallbackClientFlag},
+        std::vector<std::string>{"VYR_BINDER_DIR=" + g_work_dir + "/binder"}, dir_ + "/client.log",
+        to_test[1], to_client[0]);
+    close(to_test[1]);
+    close(to_client[0]);
+
+    // The client reports its handle once it is enabled with a callback set twice.
+    std::string line;
+    char c;
+    while (read(to_test[0], &c, 1) == 1 && c != '\n') line += c;
+    close(to_test[0]);
+    ASSERT_FALSE(line.empty()) << ReadFile(dir_ + "/client.log");
+    const int32_t handle = std::stoi(line);
+
+    int32_t result = 0;
+    ASSERT_TRUE(service_->Enable(handle, 100, &result).isOk());
+    EXPECT_EQ(-17, result);
+
+    client->Stop(SIGKILL);
+    close(to_client[1]);
+
+    // Both death links fire; the first disables and closes, the second finds nothing.
+    const auto deadline = std::chrono::steady_clock::now() + 10s;
+    do {
+        ASSERT_TRUE(service_->Enable(handle, 100, &result).isOk());
+        if (result == -38) break;
+        std::this_thread::sleep_for(20ms);
+    } while (std::chrono::steady_clock::now() < deadline);
+    EXPECT_EQ(-38, result);
+    Event event{};
+    ASSERT_TRUE(service_->PollOnce(handle, &event, &result).isOk());
+    EXPECT_EQ(-22, result);
+
+    // Still serving after every notice was handled.
+    std::this_thread::sleep_for(200ms);
+    ASSERT_TRUE(service_->Open(3, &result).isOk());
+    EXPECT_GT(result, 0);
+    EXPECT_TRUE(service_->Close(result).isOk());
+    EXPECT_TRUE(process->Running());
+    const std::string log = ReadFile(dir_ + "/service.log");
+    EXPECT_NE(std::string::npos, log.find("client " + std::to_string(handle) +
+                                          " mode 3 died; disable sensor and remove client handle"))
+        << log;
+}
+
+TEST_F(ServiceProcessTest, RegistrationFailureLeavesAnUnreachableRunningProcess) {
+    // A registry directory below a regular file cannot be created.
+    const std::string blocker = dir_ + "/not-a-directory";
+    std::ofstream(blocker) << "x";
+    Child process({VYRSERVICE_BINARY}, ServiceEnv(dir_, blocker + "/binder"), dir_ + "/service.log");
+    ASSERT_GT(process.pid(), 0);
+    const auto deadline = std::chrono::steady_clock::now() + 30s;
+    std::string log;
+    while (std::chrono::steady_clock::now() < deadline) {
+        log = ReadFile(dir_ + "/service.log");
+        if (log.find("Failed to add vyrService with status: ") != std::string::npos) break;
+        ASSERT_TRUE(process.Running()) << log;
+        std::this_thread::sleep_for(20ms);
+    }
+    ASSERT_NE(std::string::npos, log.find("Failed to add vyrService with status: ")) << log;
+    std::this_thread::sleep_for(500ms);
+    EXPECT_TRUE(process.Running());
+    ndk::SpAIBinder binder(AServiceManager_checkService(kServiceName));
+    EXPECT_TRUE(binder.get() == nullptr || !AIBinder_isAlive(binder.get()));
+}
+
+// Child role: a client that enables range events with a callback set twice, reports its handle
+// on stdout and waits to be killed.
+class IgnoringCallback : public aidl::android::vyr::BnEventCallback {
+  public:
+    ndk::ScopedAStatus OnEvent(const Event&) override { return ndk::ScopedAStatus::ok(); }
+};
+
+int RunCallbackClient() {
+    ABinderProcess_startThreadPool();
+    ndk::SpAIBinder binder(AServiceManager_checkService(kServiceName));
+    auto service = IVYRService::fromBinder(binder);
+    if (!service) {
+        fprintf(stderr, "no service\n");
+        return 2;
+    }
+    int32_t handle = 0;
+    int32_t result = 0;
+    auto callback = ndk::SharedRefBase::make<IgnoringCallback>();
+    if (!service->Open(3, &handle).isOk() || handle <= 0 ||
+        !service->SetCallback(handle, callback, &result).isOk() || result != 0 ||
+        !service->SetCallback(handle, callback, &result).isOk() || result != 0 ||
+        !service->Enable(handle, 100, &result).isOk() || result != 0) {
+        fprintf(stderr, "setup failed: handle %d result %d\n", handle, result);
+        return 3;
+    }
+    printf("%d\n", handle);
+    fflush(stdout);
+    char c;
+    while (read(0, &c, 1) > 0) {
+    }
+    return 0;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    g_self = std::filesystem::canonical("/proc/self/exe").string();
+    if (argc > 1 && strcmp(argv[1], kCallbackClientFlag) == 0) {
+        return RunCallbackClient();
+    }
+    ::testing::InitGoogleTest(&argc, argv);
+    g_work_dir = MakeTempDir();
+    std::filesystem::create_directory(g_work_dir + "/binder");
+    setenv("VYR_BINDER_DIR", (g_work_dir + "/binder").c_str(), 1);
+    const int status = RUN_ALL_TESTS();
+    std::filesystem::remove_all(g_work_dir);
+    return status;
+}

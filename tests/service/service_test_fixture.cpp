@@ -1,0 +1,148 @@
+#include "service_test_fixture.h"
+
+#include <dirent.h>
+
+#include <thread>
+
+namespace vyr_service_test {
+
+size_t ThreadCount() {
+    size_t count = 0;
+    DIR* dir = opendir("/proc/self/task");
+    if (dir == nullptr) return 0;
+    while (dirent* entry = readdir(dir)) {
+        if (entry->d_name[0] != '.') ++count;
+    }
+    closedir(dir);
+    return count;
+}
+
+bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
+    const auto deadline = std::chrono::steady_clock::now() + timeout;
+    while (ThreadCount() != count) {
+        if (std::chrono::steady_clock::now() >= deadline) return false;
+        std::this_thread::sleep_for(5ms);
+    }
+    return true;
+}
+
+std::string Hex(int32_t value) {
+    char text[16];
+    snprintf(text, sizeof(text), "%x", static_cast<unsigned>(value));
+    return text;
+}
+
+ndk::ScopedAStatus RecordingCallback::OnEvent(const Event& event) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    events_.push_back(event);
+    changed_.notify_all();
+    return ndk::ScopedAStatus::ok();
+}
+
+size_t RecordingCallback::Count() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return events_.size();
+}
+
+bool RecordingCallback::WaitForCount(size_t count, std::chrono::milliseconds timeout) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    return changed_.wait_for(lock, timeout, [&] { return events_.size() >= count; });
+}
+
+void ServiceTest::SetUp() {
+    sensor_doubles::Reset();
+    baseline_threads_ = ThreadCount();
+}
+
+void ServiceTest::TearDown() {
+    DestroyService();
+    EXPECT_TRUE(WaitForThreadCount(baseline_threads_, 5s))
+        << "threads left: " << ThreadCount() << ", expected " << baseline_threads_;
+}
+
+ServiceConfig ServiceTest::Config(std::map<std::string, bool> properties,
+                                  const std::string& display_path) {
+    ServiceConfig config;
+    config.get_bool_property = [properties](const char* key, bool default_value) {
+        auto it = properties.find(key);
+        return it == properties.end() ? default_value : it->second;
+    };
+    config.startup_delay = 0ms;
+    config.display_state_path = display_path;
+    return config;
+}
+
+void ServiceTest::MakeService(bool als, bool range) {
+    MakeService(Config({{kAlsProperty, als}, {kRangeProperty, range}}));
+}
+
+void ServiceTest::MakeService(const ServiceConfig& config) {
+    impl_ = ndk::SharedRefBase::make<VYRService>(config);
+    service_ = impl_;
+}
+
+void ServiceTest::DestroyService() {
+    service_.reset();
+    impl_.reset();
+}
+
+int32_t ServiceTest::Open(int32_t mode) {
+    int32_t handle = 0;
+    EXPECT_TRUE(service_->Open(mode, &handle).isOk());
+    return handle;
+}
+
+int32_t ServiceTest::Enable(int32_t handle, int32_t period) {
+    int32_t result = 1;
+    EXPECT_TRUE(service_->Enable(handle, period, &result).isOk());
+    return result;
+}
+
+int32_t ServiceTest::OpenAndEnable(int32_t mode, int32_t period) {
+    const int32_t handle = Open(mode);
+    EXPECT_GT(handle, 0);
+    const size_t before = WorkLogCount("EnableWork", handle);
+    EXPECT_EQ(0, Enable(handle, period));
+    EXPECT_TRUE(WaitForWorkLog("EnableWork", handle, before + 1));
+    return handle;
+}
+
+void ServiceTest::DisableAndWait(int32_t handle) {
+    const size_t before = WorkLogCount("DisableWork", handle);
+    EXPECT_TRUE(service_->Disable(handle).isOk());
+    EXPECT_TRUE(WaitForWorkLog("DisableWork", handle, before + 1));
+}
+
+namespace {
+
+bool IsWorkLog(const vyr_test::LogRecord& record, const std::string& work, int32_t handle) {
+    return record.tag == kTag && record.priority == ANDROID_LOG_INFO &&
+           record.message.rfind(work + " ", 0) == 0 &&
+           record.message.find("handle:" + Hex(handle) + (work == "EnableWork" ? " " : ",")) !=
+               std::string::npos;
+}
+
+size_t CountWorkLogs(const std::vector<vyr_test::LogRecord>& records, const std::string& work,
+                     int32_t handle) {
+    size_t count = 0;
+    for (const auto& record : records) {
+        if (IsWorkLog(record, work, handle)) ++count;
+    }
+    return count;
+}
+
+}  // namespace
+
+size_t ServiceTest::WorkLogCount(const std::string& work, int32_t handle) {
+    return CountWorkLogs(log_.Records(), work, handle);
+}
+
+bool ServiceTest::WaitForWorkLog(const std::string& work, int32_t handle, size_t count) {
+    return log_.WaitUntil(
+        [&](const std::vector<vyr_test::LogRecord>& records) {
+            return CountWorkLogs(records, work, handle) >= count;
+        },
+        kWait);
+}
+
+}  // namespace vyr_service_test

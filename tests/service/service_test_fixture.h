@@ -1,0 +1,87 @@
+#pragma once
+
+#include <aidl/android/vyr/BnEventCallback.h>
+#include <aidl/android/vyr/IVYRService.h>
+#include <android/log.h>
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <condition_variable>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "log_capture.h"
+#include "sensor_doubles.h"
+#include "vyrservice.h"
+
+namespace vyr_service_test {
+
+using aidl::android::vyr::Event;
+using aidl::android::vyr::IEventCallback;
+using aidl::android::vyr::IVYRService;
+using android::vyr::binder::ServiceConfig;
+using android::vyr::binder::VYRService;
+using namespace std::chrono_literals;
+
+inline constexpr char kTag[] = "vyrservice";
+inline constexpr char kAlsProperty[] = "persist.vendor.camera.vyr_supported";
+inline constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_supported";
+// A display-state path that cannot be opened: the display monitor ends at once.
+inline constexpr char kNoDisplayPath[] = "/nonexistent/vyr-service-test/display-state";
+inline constexpr auto kWait = 10s;
+
+// Number of threads of this process.
+size_t ThreadCount();
+// Waits until the process has `count` threads; false on time-out.
+bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout);
+
+std::string Hex(int32_t value);
+
+// An in-process callback that records what it receives.
+class RecordingCallback : public aidl::android::vyr::BnEventCallback {
+  public:
+    ndk::ScopedAStatus OnEvent(const Event& event) override;
+    size_t Count();
+    bool WaitForCount(size_t count, std::chrono::milliseconds timeout);
+
+  private:
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    std::vector<Event> events_;
+};
+
+// Builds the service on the sensor doubles with a scripted property source and no start-up
+// delay. Checks at the end of each test that no thread of the service is left.
+class ServiceTest : public ::testing::Test {
+  protected:
+    void SetUp() override;
+    void TearDown() override;
+
+    ServiceConfig Config(std::map<std::string, bool> properties,
+                         const std::string& display_path = kNoDisplayPath);
+    // Both sensors present unless said otherwise.
+    void MakeService(bool als = true, bool range = true);
+    void MakeService(const ServiceConfig& config);
+    // Drops the test's reference; the service is destroyed here.
+    void DestroyService();
+
+    int32_t Open(int32_t mode);
+    int32_t Enable(int32_t handle, int32_t period);
+    // Opens a client of `mode` and enables it; waits until the worker applied the item.
+    int32_t OpenAndEnable(int32_t mode, int32_t period);
+    // Disables and waits until the worker applied the item.
+    void DisableAndWait(int32_t handle);
+    // Number of records of `work` ("EnableWork" / "DisableWork") for `handle`.
+    size_t WorkLogCount(const std::string& work, int32_t handle);
+    bool WaitForWorkLog(const std::string& work, int32_t handle, size_t count = 1);
+
+    vyr_test::LogCapture log_;
+    std::shared_ptr<VYRService> impl_;
+    std::shared_ptr<IVYRService> service_;
+    size_t baseline_threads_ = 0;
+};
+
+}  // namespace vyr_service_test

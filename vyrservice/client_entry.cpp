@@ -1,0 +1,30 @@
+#include "client_entry.h"
+
+namespace android {
+namespace vyr {
+namespace binder {
+
+ClientEntry::~ClientEntry() {
+    // The notification thread uses this entry; it must be gone before the members are.
+    Disable();
+}
+
+void ClientEntry::Disable() {
+    state = 0;
+    if (notify_cv) {
+        // Taking the mutex once orders the state change before any wait that has not yet begun,
+        // so the notification cannot fall between the thread's test of `state` and its wait.
+        { std::lock_guard<std::mutex> lock(*notify_mutex); }
+        notify_cv->notify_all();
+    }
+    if (notify_thread && notify_thread->joinable()) {
+        notify_thread->join();
+    }
+    notify_thread.reset();
+    notify_cv.reset();
+    notify_mutex.reset();
+}
+
+}  // namespace binder
+}  // namespace vyr
+}  // namespace android

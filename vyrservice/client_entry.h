@@ -1,0 +1,51 @@
+#pragma once
+
+#include <aidl/android/vyr/IEventCallback.h>
+#include <android/binder_ibinder.h>
+
+#include <atomic>
+#include <condition_variable>
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <thread>
+#include <utility>
+
+namespace android {
+namespace vyr {
+namespace binder {
+
+class VYRService;
+
+// Identifies the callback binder and the service to the death notification.
+using DeathCookie = std::pair<AIBinder*, VYRService*>;
+
+// One open client of the service.
+struct ClientEntry {
+    explicit ClientEntry(int32_t client_mode) : mode(client_mode) {}
+    ~ClientEntry();
+    ClientEntry(const ClientEntry&) = delete;
+    ClientEntry& operator=(const ClientEntry&) = delete;
+
+    // Marks the client disabled and stops its notification thread, waking it out of its sleep.
+    void Disable();
+
+    const int32_t mode;
+    int32_t period = 0;
+    std::shared_ptr<aidl::android::vyr::IEventCallback> callback;
+    // 1 = enabled, 0 = disabled; the notification thread polls it without a lock.
+    std::atomic<int32_t> state{0};
+    std::unique_ptr<std::thread> notify_thread;
+    std::unique_ptr<std::condition_variable> notify_cv;
+    std::unique_ptr<std::mutex> notify_mutex;
+    // Not owning: `callback` keeps the binder alive.
+    AIBinder* callback_binder = nullptr;
+    AIBinder_DeathRecipient* death_recipient = nullptr;
+    // Owned by the service, which keeps every cookie for as long as a link made with it can
+    // fire, also after this entry is gone.
+    const DeathCookie* death_cookie = nullptr;
+};
+
+}  // namespace binder
+}  // namespace vyr
+}  // namespace android

@@ -1,0 +1,35 @@
+#include <android/log.h>
+
+#include <cstdlib>
+#include <memory>
+#include <set>
+
+#include "apex_update_listener.h"
+#include "vyrservice.h"
+
+namespace {
+
+constexpr char kTag[] = "vyrservice_main";
+constexpr char kCameraHalApex[] = "com.tarven.nomil.camera.hal";
+constexpr char kApexInfoList[] = "/apex/apex-info-list.xml";
+
+}  // namespace
+
+int main() {
+    std::unique_ptr<ApexUpdateListener> listener = ApexUpdateListener::Make(
+        kCameraHalApex,
+        [](const std::set<ApexUpdateListener::Info>&, const std::set<ApexUpdateListener::Info>&) {
+            // A clean exit: whatever supervises the service starts it against the new HAL.
+            __android_log_print(ANDROID_LOG_INFO, kTag, "APEX version updated. Restarting.");
+            exit(0);
+        },
+        false, kApexInfoList);
+    __android_log_print(ANDROID_LOG_INFO, kTag, "Using ApexUpdateListener: %p", listener.get());
+
+    android::vyr::binder::CreateAndRegisterService();
+    android::vyr::binder::JoinThreadPool();
+
+    // Leaving the binder pool means the service can no longer be reached.
+    listener.reset();
+    return 1;
+}

@@ -1,0 +1,717 @@
+#define LOG_TAG "vyrservice"
+
+#include "vyrservice.h"
+
+#include <android-base/logging.h>
+#include <android-base/unique_fd.h>
+#include <android/binder_manager.h>
+#include <android/binder_process.h>
+#include <android/log.h>
+#include <fcntl.h>
+#include <poll.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <cstdlib>
+#include <cstring>
+
+#include "event_conversion.h"
+
+namespace android {
+namespace vyr {
+namespace binder {
+
+using aidl::android::vyr::Event;
+using aidl::android::vyr::IEventCallback;
+
+namespace {
+
+constexpr char kTag[] = "vyrservice";
+constexpr char kAlsProperty[] = "persist.vendor.camera.vyr_supported";
+constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_supported";
+constexpr char kServiceName[] = "vyrservice";
+
+constexpr int32_t kAlsMode = 1;
+constexpr int32_t kRangeMode = 3;
+constexpr unsigned int kAlsSensorType = 0;
+constexpr unsigned int kRangeSensorType = 1;
+constexpr uint32_t kMaxClients = 10;
+constexpr int32_t kDefaultPeriodMs = 1000;
+constexpr int32_t kMaxRecomputedPeriodMs = 5000;
+constexpr int32_t kDisplayPeriodMs = 1000;
+// In low-power mode the spectral sensor is powered up again this long before the next sample.
+constexpr int32_t kLowPowerWakeMarginMs = 90;
+constexpr size_t kControlSettingsCount = 11;
+constexpr size_t kDisplayStateBufferSize = 50;
+
+#define ALOG(priority, ...) __android_log_print(priority, kTag, __VA_ARGS__)
+#define ALOGD(...) ALOG(ANDROID_LOG_DEBUG, __VA_ARGS__)
+#define ALOGI(...) ALOG(ANDROID_LOG_INFO, __VA_ARGS__)
+#define ALOGW(...) ALOG(ANDROID_LOG_WARN, __VA_ARGS__)
+#define ALOGE(...) ALOG(ANDROID_LOG_ERROR, __VA_ARGS__)
+
+// A call that waits this long for another one ends the service: something is stuck for good.
+#define LOCK_API()                                                               \
+    std::unique_lock<std::timed_mutex> lck(api_lock_, std::chrono::seconds(10)); \
+    CHECK(lck.owns_lock())
+
+ndk::ScopedAStatus Ok() {
+    return ndk::ScopedAStatus(AStatus_newOk());
+}
+
+int64_t MillisSince(std::chrono::steady_clock::time_point start) {
+    return std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() -
+                                                                 start)
+        .count();
+}
+
+// Absolute system-clock time `left` from now, saturated at the clock's largest time point.
+std::chrono::system_clock::time_point SystemDeadline(std::chrono::steady_clock::duration left) {
+    const auto now = std::chrono::system_clock::now();
+    const auto room = std::chrono::system_clock::time_point::max() - now;
+    const auto wanted = std::chrono::ceil<std::chrono::system_clock::duration>(left);
+    return wanted >= room ? std::chrono::system_clock::time_point::max() : now + wanted;
+}
+
+}  // namespace
+
+VYRService::VYRService(const ServiceConfig& config) {
+    display_handle_ = NewHandle();
+    std::this_thread::sleep_for(config.startup_delay);
+    worker_threads_.reserve(2);
+
+    if (config.get_bool_property(kAlsProperty, false)) {
+        als_sensor_ = AmbientLightSensor::Create();
+        display_thread_ =
+            std::thread(&VYRService::MonitorDisplayStatus, this, config.display_state_path);
+        if (als_sensor_ != nullptr) {
+            worker_threads_.emplace(kAlsSensorType,
+                                    std::thread(&VYRService::WorkLoop, this, kAlsSensorType));
+        } else {
+            ALOGW("SpectralSensor::Create() returned NULL.");
+        }
+    } else {
+        als_sensor_ = nullptr;
+        ALOGW("SpectralSensor::Create() returned NULL.");
+    }
+
+    if (config.get_bool_property(kRangeProperty, true)) {
+        range_sensor_ = ubk::RangeSensor::Create();
+        if (range_sensor_ != nullptr) {
+            worker_threads_.emplace(kRangeSensorType,
+                                    std::thread(&VYRService::WorkLoop, this, kRangeSensorType));
+        } else {
+            ALOGW("ubk::RangeSensor::Create() returned NULL.");
+        }
+    } else {
+        range_sensor_ = nullptr;
+        ALOGW("ubk::RangeSensor::Create() returned NULL.");
+    }
+
+    clients_.reserve(kMaxClients);
+}
+
+VYRService::~VYRService() {
+    running_ = false;
+    if (display_thread_.joinable()) {
+        display_thread_.join();
+    }
+    for (auto& [sensor_type, thread] : worker_threads_) {
+        WorkQueue& queue = work_queues_[sensor_type];
+        {
+            std::lock_guard<std::mutex> lock(queue.mutex);
+            queue.cv.notify_all();
+        }
+        if (thread.joinable()) {
+            thread.join();
+        }
+    }
+    AmbientLightSensor::Destroy();
+    ubk::RangeSensor::Destroy();
+}
+
+int32_t VYRService::NewHandle() {
+    while (true) {
+        // The generator's maximum wraps to the most negative value, which is still a handle.
+        const int32_t handle =
+            static_cast<int32_t>(static_cast<uint32_t>(rand()) + static_cast<uint32_t>(1));
+        if (handle == -1 || handle == display_handle_ || clients_.count(handle) != 0) {
+            continue;
+        }
+        return handle;
+    }
+}
+
+ServiceModeParams& VYRService::ParamsForMode(int32_t mode) {
+    if (mode == kRangeMode) {
+        return mode_params_[range_params_index_];
+    }
+    if (mode == kAlsMode) {
+        return mode_params_[als_params_index_];
+    }
+    return mode_params_[0];
+}
+
+WorkQueue& VYRService::QueueForMode(int32_t mode) {
+    return work_queues_[mode == kRangeMode ? kRangeSensorType : kAlsSensorType];
+}
+
+VYRService::ModeBlockSnapshot VYRService::SnapshotModeBlock(size_t index) {
+    std::scoped_lock lock(sensor_locks_[0], sensor_locks_[1]);
+    ServiceModeParams& params = mode_params_.at(index);
+    return ModeBlockSnapshot{params.running.load(), params.mode.load(), params.enable_count,
+                             params.active_period.load(), params.periods};
+}
+
+void VYRService::PushWorkItem(const WorkItem& item) {
+    QueueForMode(item.mode).PushAndSignal(item);
+}
+
+// Client table.
+
+ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {
+    LOCK_API();
+    if (mode != kAlsMode && mode != kRangeMode) {
+        ALOGE("%s invalid sensor mode: %d", __func__, mode);
+        *result = -EINVAL;
+    } else if (num_clients_ >= kMaxClients) {
+        ALOGE("%s max client number reached", __func__);
+        *result = -1;
+    } else if (mode == kAlsMode && als_sensor_ == nullptr) {
+        ALOGE("%s als sensor unavailable", __func__);
+        *result = -ENODEV;
+    } else if (mode == kRangeMode && range_sensor_ == nullptr) {
+        ALOGE("%s vyr range sensor unavailable", __func__);
+        *result = -ENODEV;
+    } else {
+        const int32_t handle = NewHandle();
+        clients_.emplace(std::piecewise_construct, std::forward_as_tuple(handle),
+                         std::forward_as_tuple(mode));
+        ++num_clients_;
+        *result = handle;
+    }
+    return Ok();
+}
+
+ndk::ScopedAStatus VYRService::Close(int32_t handle) {
+    LOCK_API();
+    CloseInternal(handle);
+    return Ok();
+}
+
+void VYRService::CloseInternal(int32_t handle) {
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        return;
+    }
+    // The entry's destructor stops its notification thread before the callback is dropped.
+    clients_.erase(it);
+    --num_clients_;
+}
+
+// Enable, disable and low power.
+
+ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* result) {
+    LOCK_API();
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGE("%s invalid handle %d", __func__, handle);
+        *result = -ENOSYS;
+        return Ok();
+    }
+    ClientEntry& entry = it->second;
+    if (entry.state == 1) {
+        *result = -EEXIST;
+        return Ok();
+    }
+    ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
+    const int32_t effective_period = period >= 1 ? period : kDefaultPeriodMs;
+    entry.state = 1;
+    entry.period = effective_period;
+    entry.notify_cv = std::make_unique<std::condition_variable>();
+    entry.notify_mutex = std::make_unique<std::mutex>();
+    if (entry.callback) {
+        entry.notify_thread =
+            std::make_unique<std::thread>(&VYRService::NotifyLoop, this, handle, &entry);
+    }
+    QueueForMode(entry.mode).PushAndSignal(WorkItem{true, entry.mode, handle, effective_period});
+    *result = 0;
+    return Ok();
+}
+
+ndk::ScopedAStatus VYRService::Disable(int32_t handle) {
+    LOCK_API();
+    DisableInternal(handle, false);
+    return Ok();
+}
+
+void VYRService::DisableInternal(int32_t handle, bool) {
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGW("%s invalid handle %d", __func__, handle);
+        return;
+    }
+    ClientEntry& entry = it->second;
+    if (entry.state == 0) {
+        ALOGD("%s already in disable state %d", __func__, handle);
+        return;
+    }
+    ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
+    entry.Disable();
+    QueueForMode(entry.mode).PushAndSignal(WorkItem{false, entry.mode, handle, 0});
+}
+
+ndk::ScopedAStatus VYRService::EnableLowPower(int32_t handle, bool enable, int32_t* result) {
+    LOCK_API();
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGE("%s invalid handle %d", __func__, handle);
+        *result = -ENOSYS;
+        return Ok();
+    }
+    if (it->second.mode == kRangeMode) {
+        *result = -EINVAL;
+        return Ok();
+    }
+    // Service-wide: the last caller wins.
+    low_power_ = enable;
+    *result = 0;
+    return Ok();
+}
+
+// Callback registration and client death.
+
+ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
+                                           const std::shared_ptr<IEventCallback>& callback,
+                                           int32_t* result) {
+    LOCK_API();
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGW("%s invalid handle %d", __func__, handle);
+        *result = -EINVAL;
+        return Ok();
+    }
+    ClientEntry& entry = it->second;
+    if (entry.state == 1) {
+        // The notification thread reads the callback without a lock.
+        ALOGE("%s failed. callback can only be set at DISABLE state", __func__);
+        *result = -1;
+        return Ok();
+    }
+    // A binder of another interface arrives as an empty pointer; nothing could be called on it.
+    if (!callback) {
+        ALOGE("%s null callback", __func__);
+        *result = -EINVAL;
+        return Ok();
+    }
+    entry.callback = callback;
+    entry.callback_binder = entry.callback->asBinder().get();
+
+    DeathLink& link = death_links_.emplace_back(DeathLink{
+        std::make_unique<DeathCookie>(entry.callback_binder, this),
+        {AIBinder_DeathRecipient_new(&VYRService::OnBinderDied), &AIBinder_DeathRecipient_delete}});
+    entry.death_cookie = link.cookie.get();
+    entry.death_recipient = link.recipient.get();
+    AIBinder_linkToDeath(entry.callback_binder, entry.death_recipient, link.cookie.get());
+    *result = 0;
+    return Ok();
+}
+
+void VYRService::OnBinderDied(void* cookie) {
+    ALOGI("Receive binder death callback");
+    const auto* death_cookie = static_cast<const DeathCookie*>(cookie);
+    death_cookie->second->HandleBinderDied(death_cookie->first);
+}
+
+void VYRService::HandleBinderDied(AIBinder* binder) {
+    LOCK_API();
+    auto it = std::find_if(clients_.begin(), clients_.end(), [binder](const auto& client) {
+        return client.second.callback_binder == binder;
+    });
+    if (it == clients_.end()) {
+        return;
+    }
+    const int32_t handle = it->first;
+    ClientEntry& entry = it->second;
+    ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry.mode);
+    AIBinder_unlinkToDeath(entry.callback_binder, entry.death_recipient, nullptr);
+    DisableInternal(handle, true);
+    CloseInternal(handle);
+}
+
+// Sensor parameters and torch state.
+
+ndk::ScopedAStatus VYRService::ConfigureParameters(int32_t handle,
+                                                   const std::vector<int32_t>& params,
+                                                   int32_t* result) {
+    LOCK_API();
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGE("%s invalid handle %d", __func__, handle);
+        *result = -ENOSYS;
+        return Ok();
+    }
+    const int32_t mode = it->second.mode;
+    if (mode != kRangeMode) {
+        ALOGE("%s, mode %d is not supported", __func__, mode);
+        *result = -EINVAL;
+        return Ok();
+    }
+    if (params.size() != kControlSettingsCount) {
+        ALOGE("%s data size %zu is not equal to %zu", __func__, params.size() * sizeof(int32_t) / 4,
+              kControlSettingsCount);
+        *result = -EINVAL;
+        return Ok();
+    }
+    // Open admits no range client without the sensor; this only keeps a broken setup alive.
+    if (range_sensor_ == nullptr) {
+        ALOGE("%s vyr range sensor unavailable", __func__);
+        *result = -ENODEV;
+        return Ok();
+    }
+    ControlSettings settings{};
+    settings.frame_rate_hz = params[0];
+    settings.timing_budget_ms = params[1];
+    settings.signal_threshold = params[2];
+    settings.sigma_threshold_mm = params[3];
+    settings.smudge_correction = params[4] == 1;
+    settings.crosstalk_correction = params[5] == 1;
+    settings.ambient_correction = params[6] == 1;
+    settings.reserved = 0;
+    settings.distance_mode = params[7];
+    settings.range_min_mm = params[8];
+    settings.range_max_mm = params[9];
+    settings.zone_layout = params[10];
+    range_sensor_->ConfigureParameters(settings);
+    *result = 0;
+    return Ok();
+}
+
+ndk::ScopedAStatus VYRService::SetTorchLightState(int32_t state) {
+    LOCK_API();
+    if (als_sensor_ != nullptr) {
+        als_sensor_->SetTorchLightState(static_cast<unsigned char>(state));
+        ALOGI("torch state changed to %d", state);
+    }
+    return Ok();
+}
+
+// Workers.
+
+void VYRService::WorkLoop(unsigned int sensor_type) {
+    WorkQueue& queue = work_queues_[sensor_type];
+    std::mutex& sensor_lock = sensor_locks_[sensor_type];
+    while (running_) {
+        {
+            std::unique_lock<std::mutex> lock(queue.mutex);
+            queue.cv.wait(lock, [&] { return !queue.items.empty() || !running_; });
+        }
+        if (!running_) {
+            return;
+        }
+        WorkItem item;
+        {
+            std::lock_guard<std::mutex> lock(queue.mutex);
+            item = queue.items.front();
+            queue.items.pop_front();
+        }
+        std::lock_guard<std::mutex> lock(sensor_lock);
+        ServiceModeParams& params = ParamsForMode(item.mode);
+        if (item.enable) {
+            EnableWork(item, &params, sensor_type);
+        } else {
+            DisableWork(item, &params, sensor_type);
+        }
+    }
+}
+
+void VYRService::EnableWork(const WorkItem& item, ServiceModeParams* params,
+                            unsigned int sensor_type) {
+    params->mode = item.mode;
+    ++params->enable_count;
+    params->periods[item.handle] = item.period;
+    const int32_t active_period = params->periods.size() == 1
+                                      ? item.period
+                                      : std::min(params->active_period.load(), item.period);
+    params->active_period = active_period;
+    ALOGI("%s mode %d, enable count %d, handle:%x sampling/active period %d/%d, sensor type:%d",
+          __func__, item.mode, params->enable_count, item.handle, item.period, active_period,
+          sensor_type);
+
+    bool started = true;
+    if (item.mode == kRangeMode) {
+        started = range_sensor_->Init() == 0;
+        range_sensor_->Enable(true);
+    } else if (item.mode == kAlsMode) {
+        if (params->enable_count == 1) {
+            als_sensor_->enabled = true;
+        }
+    }
+    params->running = true;
+    if (started && !params->process_thread.joinable()) {
+        params->process_thread = std::thread(&VYRService::ProcessLoop, this, params);
+    }
+}
+
+void VYRService::DisableWork(const WorkItem& item, ServiceModeParams* params,
+                             unsigned int sensor_type) {
+    --params->enable_count;
+    params->periods.erase(item.handle);
+    if (params->enable_count < 1) {
+        if (params->enable_count < 0) {
+            ALOGW("%s: mode %d enable count becomes negative (%d)", __func__, item.mode,
+                  params->enable_count);
+        }
+        params->running = false;
+        if (item.mode == kRangeMode) {
+            range_sensor_->Enable(false);
+        } else if (item.mode == kAlsMode) {
+            als_sensor_->enabled = false;
+        }
+        // Taking the mutex once keeps the notification from falling between WaitFor's test of
+        // `running` and its wait.
+        { std::lock_guard<std::mutex> lock(params->wait_mutex); }
+        params->wait_cv.notify_all();
+        if (params->process_thread.joinable()) {
+            params->process_thread.join();
+        }
+    } else {
+        int32_t active_period = kMaxRecomputedPeriodMs;
+        for (const auto& [handle, period] : params->periods) {
+            active_period = std::min(active_period, period);
+        }
+        params->active_period = active_period;
+    }
+    ALOGI("%s mode %d, enable count %d, handle:%x, active_period:%d, sensor type:%d", __func__,
+          item.mode, params->enable_count, item.handle, params->active_period.load(), sensor_type);
+    if (item.mode == kRangeMode) {
+        range_sensor_->Uninit();
+    }
+}
+
+// Sampling.
+
+void VYRService::ProcessLoop(ServiceModeParams* params) {
+    ALSResult reading{};
+    MultiRangingData data{};
+    do {
+        const auto start = std::chrono::steady_clock::now();
+        int32_t mode = params->mode;
+        const int32_t period = params->active_period;
+        if (mode == kAlsMode || mode == kRangeMode) {
+            if (mode == kAlsMode) {
+                als_sensor_->ReadSingleShot(&reading, true, 30);
+            } else {
+                range_sensor_->Process(3, &data);
+            }
+            // A reading taken across a disable is stale for whoever enables next.
+            if (!params->running) {
+                return;
+            }
+            std::lock_guard<std::mutex> lock(params->data_mutex);
+            if (mode == kAlsMode) {
+                params->als_data = reading;
+            } else {
+                params->range_data = data;
+            }
+            params->polled_handles.clear();
+        }
+
+        const int64_t remaining = period - MillisSince(start);
+        mode = params->mode;
+        if (mode != kRangeMode && remaining > kLowPowerWakeMarginMs && mode == kAlsMode &&
+            low_power_ && num_clients_ == 1) {
+            const auto off_start = std::chrono::steady_clock::now();
+            als_sensor_->Disable();
+            WaitFor(params, static_cast<int32_t>(remaining - kLowPowerWakeMarginMs));
+            const int64_t rest = remaining - MillisSince(off_start);
+            if (rest >= 1) {
+                WaitFor(params, static_cast<int32_t>(rest));
+            }
+        } else if (remaining >= 1) {
+            WaitFor(params, static_cast<int32_t>(remaining));
+        }
+    } while (params->running.load(std::memory_order_acquire));
+}
+
+void VYRService::WaitFor(ServiceModeParams* params, int32_t ms) {
+    std::unique_lock<std::mutex> lock(params->wait_mutex);
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(ms);
+    while (true) {
+        if (!params->running.load(std::memory_order_acquire)) {
+            return;
+        }
+        const auto now = std::chrono::steady_clock::now();
+        if (now < deadline) {
+            params->wait_cv.wait_until(lock, SystemDeadline(deadline - now));
+        }
+        if (std::chrono::steady_clock::now() >= deadline) {
+            return;
+        }
+    }
+}
+
+// Display state.
+
+void VYRService::MonitorDisplayStatus(const std::string& path) {
+    base::unique_fd fd(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    if (fd.get() < 0) {
+        ALOGE("vyrservice cannot open the display state file for reading.: %s", strerror(errno));
+        return;
+    }
+    if (als_sensor_ == nullptr) {
+        ALOGE("%s: ALS sensor unavailable", __func__);
+        return;
+    }
+    bool lit = false;
+    char buffer[kDisplayStateBufferSize];
+    while (running_) {
+        // sysfs signals a changed attribute with POLLPRI.
+        pollfd pfd{fd.get(), POLLPRI, 0};
+        poll(&pfd, 1, -1);
+        if ((pfd.revents & POLLPRI) == 0) {
+            continue;
+        }
+        memset(buffer, 0, sizeof(buffer));
+        lseek(fd.get(), 0, SEEK_SET);
+        const ssize_t count = read(fd.get(), buffer, sizeof(buffer));
+        if (count < 0) {
+            ALOGE("vyrservice failed to read display state file: %s", strerror(errno));
+            if (lit) {
+                work_queues_[kAlsSensorType].PushAndSignal(
+                    WorkItem{false, kAlsMode, display_handle_, 0});
+            }
+            lit = false;
+            continue;
+        }
+        buffer[std::min<size_t>(count, sizeof(buffer) - 1)] = '\0';
+        const std::string state(buffer);
+        const bool now_lit =
+            state.find("On") != std::string::npos || state.find("HBM") != std::string::npos;
+        if (now_lit && !lit) {
+            ALOGI("Enable sensor for display state: %s", state.c_str());
+            work_queues_[kAlsSensorType].PushAndSignal(
+                WorkItem{true, kAlsMode, display_handle_, kDisplayPeriodMs});
+        } else if (!now_lit && lit) {
+            ALOGI("Disable sensor for display state: %s", state.c_str());
+            work_queues_[kAlsSensorType].PushAndSignal(
+                WorkItem{false, kAlsMode, display_handle_, 0});
+        }
+        lit = now_lit;
+    }
+}
+
+// Data path.
+
+bool VYRService::PollInternal(int32_t handle, int32_t mode, Event* event) {
+    Event local{};
+    ServiceModeParams* params;
+    if (mode == kRangeMode) {
+        params = &mode_params_[range_params_index_];
+    } else if (mode == kAlsMode) {
+        params = &mode_params_[als_params_index_];
+    } else {
+        ALOGE("%s, invalid mode", __func__);
+        return false;
+    }
+    {
+        std::lock_guard<std::mutex> lock(params->data_mutex);
+        if (params->polled_handles.count(handle) != 0) {
+            return false;
+        }
+    }
+    // A sample published between the test above and this section is the one taken.
+    ALSResult als_data;
+    MultiRangingData range_data;
+    {
+        std::lock_guard<std::mutex> lock(params->data_mutex);
+        params->polled_handles.insert(handle);
+        als_data = params->als_data;
+        range_data = params->range_data;
+    }
+    const bool valid = mode == kRangeMode ? range_data.valid != 0 : als_data.valid != 0;
+    if (!valid) {
+        ALOGW("%s, invalid data", __func__);
+        return false;
+    }
+    if (mode == kRangeMode) {
+        ConvertRangingData(range_data, &local);
+    } else {
+        ConvertAlsResult(als_data, &local);
+    }
+    event->status = local.status;
+    event->timestamp = local.timestamp;
+    event->value0 = local.value0;
+    event->value1 = local.value1;
+    event->data = std::move(local.data);
+    return true;
+}
+
+ndk::ScopedAStatus VYRService::PollOnce(int32_t handle, Event* event, int32_t* result) {
+    LOCK_API();
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGE("%s, invalid handle", __func__);
+        *result = -EINVAL;
+        return Ok();
+    }
+    *result = PollInternal(handle, it->second.mode, event) ? 0 : -ENODATA;
+    return Ok();
+}
+
+void VYRService::NotifyLoop(int32_t handle, ClientEntry* entry) {
+    if (entry == nullptr) {
+        return;
+    }
+    Event event{};
+    while (entry->state == 1 && entry->callback) {
+        const bool ok = PollInternal(handle, entry->mode, &event);
+        if (entry->state == 0) {
+            break;
+        }
+        if (ok) {
+            // A failed delivery is the death handler's business, not this loop's.
+            entry->callback->OnEvent(event);
+            if (entry->state == 0) {
+                break;
+            }
+        }
+        const auto deadline = std::chrono::steady_clock::now() +
+                              std::chrono::nanoseconds(int64_t{entry->period} * 1000000);
+        std::unique_lock<std::mutex> lock(*entry->notify_mutex);
+        while (entry->state != 0) {
+            const auto left = deadline - std::chrono::steady_clock::now();
+            if (left >= std::chrono::nanoseconds(1)) {
+                entry->notify_cv->wait_for(lock, left);
+            }
+            if (std::chrono::steady_clock::now() >= deadline) {
+                break;
+            }
+        }
+    }
+}
+
+// Process entry.
+
+void CreateAndRegisterService() {
+    // The service lives for the whole process whatever the registration's outcome, so that its
+    // threads keep running and no exit path destroys it under them.
+    static auto* const service = new std::shared_ptr<VYRService>(
+        ndk::SharedRefBase::make<VYRService>(ServiceConfig::Production()));
+    ndk::SpAIBinder binder = (*service)->asBinder();
+    const binder_status_t status = AServiceManager_addService(binder.get(), kServiceName);
+    if (status != STATUS_OK) {
+        ALOGE("Failed to add vyrService with status: %d", status);
+    }
+}
+
+void JoinThreadPool() {
+    ABinderProcess_startThreadPool();
+    ABinderProcess_joinThreadPool();
+}
+
+}  // namespace binder
+}  // namespace vyr
+}  // namespace android
