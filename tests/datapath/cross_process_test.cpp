@@ -1,0 +1,278 @@
+// The real service binary on the simulators, with real client processes (vyrctl): callbacks
+// across processes, two clients on one sensor, and clients that die.
+
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+
+#include <chrono>
+#include <map>
+#include <memory>
+#include <regex>
+#include <set>
+#include <thread>
+#include <vector>
+
+#include "child_process.h"
+#include "service_process.h"
+
+namespace vyr_datapath {
+namespace {
+
+using aidl::android::vyr::Event;
+using aidl::android::vyr::IVYRService;
+using std::chrono::milliseconds;
+using std::chrono::steady_clock;
+
+constexpr int32_t kRange = 3;
+// The service waits 4 s before it registers; sanitizer builds start slower still.
+constexpr milliseconds kRegistration{30000};
+constexpr milliseconds kWait{10000};
+
+int64_t JsonInt(const std::string& json, const std::string& key) {
+    std::smatch match;
+    std::regex pattern("\"" + key + "\":(-?[0-9]+)");
+    if (!std::regex_search(json, match, pattern)) return INT64_MIN;
+    return std::stoll(match[1]);
+}
+
+size_t JsonArrayLength(const std::string& json, const std::string& key) {
+    std::smatch match;
+    std::regex pattern("\"" + key + "\":\\[([^\\]]*)\\]");
+    if (!std::regex_search(json, match, pattern)) return 0;
+    std::string items = match[1];
+    if (items.empty()) return 0;
+    return static_cast<size_t>(std::count(items.begin(), items.end(), ',')) + 1;
+}
+
+bool ExitedWith(const std::optional<int>& status, int code) {
+    return status && WIFEXITED(*status) && WEXITSTATUS(*status) == code;
+}
+
+class CrossProcessTest : public ::testing::Test {
+  protected:
+    static void SetUpTestSuite() {
+        process_ = new ServiceProcess();
+        if (process_->Start(VYRSERVICE_PATH)) service_ = process_->WaitForService(kRegistration);
+    }
+
+    static void TearDownTestSuite() {
+        service_.reset();
+        delete process_;
+        process_ = nullptr;
+    }
+
+    void SetUp() override {
+        ASSERT_NE(service_, nullptr) << "vyrservice did not register; its log:\n"
+                                     << process_->Log();
+        ASSERT_TRUE(process_->Running());
+    }
+
+    void TearDown() override {
+        EXPECT_TRUE(process_->Running()) << "vyrservice ended; its log:\n" << process_->Log();
+    }
+
+    std::unique_ptr<ChildProcess> Vyrctl(std::vector<std::string> args) {
+        args.insert(args.begin(), VYRCTL_PATH);
+        auto child = std::make_unique<ChildProcess>(
+            args, process_->ClientEnvironment(),
+            process_->dir() + "/vyrctl-" + std::to_string(++clients_) + ".log");
+        EXPECT_TRUE(child->started());
+        return child;
+    }
+
+    // Sends one shell command and returns what follows its " -> ".
+    std::string ShellCommand(ChildProcess* shell, const std::string& command) {
+        EXPECT_TRUE(shell->WriteLine(command));
+        std::optional<std::string> line = shell->ReadLineStartingWith(command + " -> ", kWait);
+        EXPECT_TRUE(line) << "no answer to '" << command << "'";
+        return line ? line->substr(command.size() + 4) : "";
+    }
+
+    int32_t PollResult(int32_t handle) {
+        Event event{};
+        int32_t result = 1;
+        EXPECT_TRUE(service_->PollOnce(handle, &event, &result).isOk());
+        return result;
+    }
+
+    bool WaitForUnknownHandle(int32_t handle) {
+        auto deadline = steady_clock::now() + kWait;
+        while (PollResult(handle) != -22) {
+            if (steady_clock::now() >= deadline) return false;
+            std::this_thread::sleep_for(milliseconds(50));
+        }
+        return true;
+    }
+
+    static ServiceProcess* process_;
+    static std::shared_ptr<IVYRService> service_;
+    int clients_ = 0;
+};
+
+ServiceProcess* CrossProcessTest::process_ = nullptr;
+std::shared_ptr<IVYRService> CrossProcessTest::service_;
+
+TEST_F(CrossProcessTest, CallbackClientReceivesEventsAtItsPeriod) {
+    auto stream = Vyrctl({"--timeout", "10", "stream", "range", "--callback", "--period", "100",
+                          "--count", "5", "--json"});
+    std::vector<std::string> lines;
+    std::vector<steady_clock::time_point> arrivals;
+    while (std::optional<std::string> line = stream->ReadLine(kWait)) {
+        lines.push_back(*line);
+        arrivals.push_back(steady_clock::now());
+    }
+    EXPECT_TRUE(ExitedWith(stream->Wait(kWait), 0));
+    ASSERT_EQ(lines.size(), 5u);
+
+    int64_t previous = -1;
+    for (const std::string& line : lines) {
+        EXPECT_NE(line.find("\"sensor\":\"range\""), std::string::npos) << line;
+        int64_t timestamp = JsonInt(line, "timestamp");
+        EXPECT_GT(timestamp, previous) << "a sample was delivered twice: " << line;
+        previous = timestamp;
+        int64_t zones = JsonInt(line, "zone_count");
+        EXPECT_EQ(JsonArrayLength(line, "data"), static_cast<size_t>(10 + 11 * zones)) << line;
+    }
+    // Deliveries are at least a period apart (4 gaps of 100 ms, less scheduling slack).
+    EXPECT_GE(arrivals.back() - arrivals.front(), milliseconds(300));
+    EXPECT_LT(arrivals.back() - arrivals.front(), milliseconds(5000));
+    // The stream disabled its handle on the way out.
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+TEST_F(CrossProcessTest, InterruptedStreamDisablesAndClosesItsHandle) {
+    auto stream = Vyrctl({"stream", "range", "--poll", "--period", "100", "--json"});
+    std::optional<std::string> first = stream->ReadLine(kWait);
+    ASSERT_TRUE(first);
+    int32_t handle = static_cast<int32_t>(JsonInt(*first, "handle"));
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "1", kWait));
+    stream->Signal(SIGINT);
+    EXPECT_TRUE(ExitedWith(stream->Wait(kWait), 0));
+    EXPECT_EQ(PollResult(handle), -22) << "the stream left its handle open";
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+TEST_F(CrossProcessTest, TwoClientsEachTakeEverySampleOnce) {
+    int32_t first = 0;
+    int32_t second = 0;
+    ASSERT_TRUE(service_->Open(kRange, &first).isOk());
+    ASSERT_TRUE(service_->Open(kRange, &second).isOk());
+    ASSERT_GT(first, 0);
+    ASSERT_GT(second, 0);
+    int32_t result = 1;
+    ASSERT_TRUE(service_->Enable(first, 50, &result).isOk());
+    ASSERT_EQ(result, 0);
+
+    std::map<int32_t, std::vector<int64_t>> taken;
+    auto end = steady_clock::now() + milliseconds(1500);
+    while (steady_clock::now() < end) {
+        for (int32_t handle : {first, second}) {
+            Event event{};
+            ASSERT_TRUE(service_->PollOnce(handle, &event, &result).isOk());
+            if (result == 0)
+                taken[handle].push_back(event.timestamp);
+            else
+                EXPECT_EQ(result, -61);
+        }
+        std::this_thread::sleep_for(milliseconds(10));
+    }
+    service_->Disable(first);
+    service_->Close(first);
+    service_->Close(second);
+
+    std::set<int64_t> common;
+    for (int32_t handle : {first, second}) {
+        const std::vector<int64_t>& stamps = taken[handle];
+        ASSERT_GE(stamps.size(), 3u) << "handle " << handle;
+        for (size_t i = 1; i < stamps.size(); ++i) {
+            EXPECT_GT(stamps[i], stamps[i - 1]) << "handle " << handle << " took a sample twice";
+        }
+    }
+    std::set_intersection(taken[first].begin(), taken[first].end(), taken[second].begin(),
+                          taken[second].end(), std::inserter(common, common.begin()));
+    EXPECT_FALSE(common.empty()) << "the two handles never took the same sample";
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+TEST_F(CrossProcessTest, KilledClientIsDisabledAndClosed) {
+    auto shell = Vyrctl({"shell"});
+    std::string opened = ShellCommand(shell.get(), "open 3");
+    int32_t handle = std::atoi(opened.c_str());
+    ASSERT_GT(handle, 0) << opened;
+    std::string h = std::to_string(handle);
+    ASSERT_EQ(ShellCommand(shell.get(), "callback " + h), "0");
+    ASSERT_EQ(ShellCommand(shell.get(), "enable " + h + " 100"), "0");
+    ASSERT_TRUE(shell->ReadLineStartingWith("event " + h + " ", kWait))
+        << "no event reached the shell's callback";
+    ASSERT_TRUE(process_->WaitForSensorState("range.enabled", "1", kWait));
+
+    shell->Signal(SIGKILL);
+    ASSERT_TRUE(shell->Wait(kWait));
+
+    EXPECT_TRUE(process_->WaitForLog(
+        "client " + h + " mode 3 died; disable sensor and remove client handle", kWait))
+        << process_->Log();
+    EXPECT_TRUE(WaitForUnknownHandle(handle)) << "the dead client's handle is still open";
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+TEST_F(CrossProcessTest, DeathOfAClosedClientChangesNothing) {
+    int32_t survivor = 0;
+    int32_t result = 1;
+    ASSERT_TRUE(service_->Open(kRange, &survivor).isOk());
+    ASSERT_GT(survivor, 0);
+    ASSERT_TRUE(service_->Enable(survivor, 50, &result).isOk());
+    ASSERT_EQ(result, 0);
+
+    auto shell = Vyrctl({"shell"});
+    std::string h = ShellCommand(shell.get(), "open 3");
+    ASSERT_GT(std::atoi(h.c_str()), 0) << h;
+    ASSERT_EQ(ShellCommand(shell.get(), "callback " + h), "0");
+    ASSERT_EQ(ShellCommand(shell.get(), "enable " + h + " 100"), "0");
+    ASSERT_TRUE(shell->ReadLineStartingWith("event " + h + " ", kWait));
+    ASSERT_EQ(ShellCommand(shell.get(), "disable " + h), "ok");
+    ASSERT_EQ(ShellCommand(shell.get(), "close " + h), "ok");
+    size_t notices_before = 0;
+    for (size_t at = 0;
+         (at = process_->Log().find("Receive binder death callback", at)) != std::string::npos;
+         ++at) {
+        ++notices_before;
+    }
+
+    shell->Signal(SIGKILL);
+    ASSERT_TRUE(shell->Wait(kWait));
+    // The notice arrives and finds no client.
+    auto deadline = steady_clock::now() + kWait;
+    size_t notices = notices_before;
+    while (notices == notices_before && steady_clock::now() < deadline) {
+        std::this_thread::sleep_for(milliseconds(50));
+        notices = 0;
+        std::string log = process_->Log();
+        for (size_t at = 0;
+             (at = log.find("Receive binder death callback", at)) != std::string::npos; ++at) {
+            ++notices;
+        }
+    }
+    EXPECT_GT(notices, notices_before) << "no death notice reached the service";
+    EXPECT_EQ(process_->Log().find("client " + h + " mode 3 died"), std::string::npos);
+
+    // The other client goes on sampling, and new clients are served.
+    bool fresh_sample = false;
+    deadline = steady_clock::now() + kWait;
+    while (!fresh_sample && steady_clock::now() < deadline) {
+        fresh_sample = PollResult(survivor) == 0;
+        if (!fresh_sample) std::this_thread::sleep_for(milliseconds(20));
+    }
+    EXPECT_TRUE(fresh_sample);
+    int32_t newcomer = 0;
+    ASSERT_TRUE(service_->Open(kRange, &newcomer).isOk());
+    EXPECT_GT(newcomer, 0);
+    service_->Close(newcomer);
+    service_->Disable(survivor);
+    service_->Close(survivor);
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+}  // namespace
+}  // namespace vyr_datapath

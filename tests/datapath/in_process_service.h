@@ -1,0 +1,61 @@
+#pragma once
+
+// Fixture: the service built in this process on the sensor test doubles, with no start-up delay
+// and no display monitor input. Every test leaves it with all its clients disabled and the
+// workers idle, so that destroying it joins nothing that is still sampling.
+
+#include <aidl/android/vyr/Event.h>
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <cstdint>
+#include <memory>
+#include <set>
+
+#include "log_capture.h"
+#include "sensor_doubles.h"
+#include "vyrservice.h"
+
+namespace vyr_datapath {
+
+constexpr int32_t kAls = 1;
+constexpr int32_t kRange = 3;
+constexpr char kTag[] = "vyrservice";
+constexpr std::chrono::milliseconds kWait{5000};
+
+class InProcessServiceTest : public ::testing::Test {
+  protected:
+    void SetUp() override;
+    void TearDown() override;
+
+    // Rebuilds the service with the light sensor's property set as given.
+    void StartService(bool als_property);
+
+    // Open that must succeed; the handle is disabled and closed at tear-down.
+    int32_t OpenOk(int32_t mode);
+    // Enable that must succeed.
+    void EnableOk(int32_t handle, int32_t period_ms);
+    void DisableNow(int32_t handle);
+    int32_t Poll(int32_t handle, aidl::android::vyr::Event* event);
+
+    // Holds the sensor read of `mode`, enables `handle` (of that mode) at 1 ms and lets exactly
+    // one sample through: afterwards that sample is stored and the next read is held, so nothing
+    // replaces it until PublishNextSample.
+    void StartHeldSampling(int32_t handle, int32_t mode);
+    // Lets exactly one more sample of the held mode through.
+    void PublishNextSample();
+    // Waits until both mode blocks have no enable in force and no sampling thread.
+    void WaitForIdleWorkers();
+
+    static const char* ReadCallOf(int32_t mode);
+
+    std::unique_ptr<vyr_test::LogCapture> log_;
+    std::shared_ptr<android::vyr::binder::VYRService> service_;
+
+  private:
+    std::set<int32_t> opened_;
+    std::set<int32_t> enabled_;
+    const char* held_call_ = nullptr;
+};
+
+}  // namespace vyr_datapath

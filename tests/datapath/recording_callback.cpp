@@ -1,0 +1,32 @@
+#include "recording_callback.h"
+
+#include <android/binder_status.h>
+
+namespace vyr_datapath {
+
+ndk::ScopedAStatus RecordingCallback::OnEvent(const aidl::android::vyr::Event& event) {
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        events_.push_back(event);
+    }
+    changed_.notify_all();
+    if (failing_.load()) return ndk::ScopedAStatus::fromStatus(STATUS_UNKNOWN_ERROR);
+    return ndk::ScopedAStatus::ok();
+}
+
+std::vector<aidl::android::vyr::Event> RecordingCallback::Events() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return events_;
+}
+
+size_t RecordingCallback::Count() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return events_.size();
+}
+
+bool RecordingCallback::WaitForEvents(size_t count, std::chrono::milliseconds timeout) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    return changed_.wait_for(lock, timeout, [&] { return events_.size() >= count; });
+}
+
+}  // namespace vyr_datapath

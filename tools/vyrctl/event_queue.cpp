@@ -1,0 +1,23 @@
+#include "event_queue.h"
+
+namespace vyrctl {
+
+void EventQueue::Push(const aidl::android::vyr::Event& event) {
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        events_.push_back(event);
+    }
+    changed_.notify_all();
+}
+
+std::optional<aidl::android::vyr::Event> EventQueue::Pop(std::chrono::milliseconds timeout) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    if (!changed_.wait_for(lock, timeout, [this] { return !events_.empty(); })) {
+        return std::nullopt;
+    }
+    aidl::android::vyr::Event event = std::move(events_.front());
+    events_.pop_front();
+    return event;
+}
+
+}  // namespace vyrctl

@@ -1,0 +1,42 @@
+#include "one_shot_commands.h"
+
+#include "options.h"
+#include "result_text.h"
+
+namespace vyrctl {
+
+int RunConfigure(const Connection& connection, const std::vector<int32_t>& values, LineWriter* out,
+                 LineWriter* err) {
+    const auto& service = connection.service();
+    int32_t handle = 0;
+    ndk::ScopedAStatus status = service->Open(kModeRange, &handle);
+    if (!status.isOk()) {
+        err->WriteLine("error: open range: " + DescribeStatus(status));
+        return 1;
+    }
+    if (handle < 0) {
+        err->WriteLine("error: open range -> " + DescribeResult(handle));
+        return 1;
+    }
+    int32_t result = 0;
+    status = service->ConfigureParameters(handle, values, &result);
+    service->Close(handle);
+    if (!status.isOk()) {
+        err->WriteLine("error: configure: " + DescribeStatus(status));
+        return 1;
+    }
+    out->WriteLine("configure -> " + DescribeResult(result));
+    return result == 0 ? 0 : 1;
+}
+
+int RunTorch(const Connection& connection, int32_t state, LineWriter* out, LineWriter* err) {
+    ndk::ScopedAStatus status = connection.service()->SetTorchLightState(state);
+    if (!status.isOk()) {
+        err->WriteLine("error: torch: " + DescribeStatus(status));
+        return 1;
+    }
+    out->WriteLine("torch " + std::to_string(state) + " -> ok");
+    return 0;
+}
+
+}  // namespace vyrctl

@@ -1,0 +1,18 @@
+#pragma once
+
+// Commands that make one request and leave: `configure` and `torch`.
+
+#include <string>
+#include <vector>
+
+#include "connection.h"
+#include "line_writer.h"
+
+namespace vyrctl {
+
+// Opens a range handle, sends the eleven values, prints the result and closes the handle.
+int RunConfigure(const Connection& connection, const std::vector<int32_t>& values, LineWriter* out,
+                 LineWriter* err);
+int RunTorch(const Connection& connection, int32_t state, LineWriter* out, LineWriter* err);
+
+}  // namespace vyrctl

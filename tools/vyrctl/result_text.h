@@ -1,0 +1,11 @@
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+namespace vyrctl {
+
+// A short reading of a service result code, e.g. "-19 (no such device: sensor unavailable)".
+std::string DescribeResult(int32_t result);
+
+}  // namespace vyrctl

@@ -1,0 +1,259 @@
+// Unit tests of vyrctl's parsing, decoding and shell, against an in-process fake service.
+
+#include <aidl/android/vyr/BnVYRService.h>
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <string>
+#include <vector>
+
+#include "event_format.h"
+#include "line_writer.h"
+#include "options.h"
+#include "shell.h"
+
+namespace vyrctl {
+namespace {
+
+using aidl::android::vyr::Event;
+using aidl::android::vyr::IEventCallback;
+
+// Answers every call with fixed results and records what it was asked.
+class FakeService : public aidl::android::vyr::BnVYRService {
+  public:
+    ndk::ScopedAStatus Open(int32_t mode, int32_t* result) override {
+        calls.push_back("Open " + std::to_string(mode));
+        *result = mode == 3 ? 42 : -22;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus Close(int32_t handle) override {
+        calls.push_back("Close " + std::to_string(handle));
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus Enable(int32_t handle, int32_t period, int32_t* result) override {
+        calls.push_back("Enable " + std::to_string(handle) + " " + std::to_string(period));
+        *result = 0;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus Disable(int32_t handle) override {
+        calls.push_back("Disable " + std::to_string(handle));
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus SetCallback(int32_t, const std::shared_ptr<IEventCallback>&,
+                                   int32_t* result) override {
+        *result = 0;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus EnableLowPower(int32_t, bool, int32_t* result) override {
+        *result = -22;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus PollOnce(int32_t handle, Event* event, int32_t* result) override {
+        if (handle != 42) {
+            *result = -61;
+            return ndk::ScopedAStatus::ok();
+        }
+        event->status = static_cast<int8_t>(0xAB);
+        event->timestamp = 123;
+        event->value0 = 0.5f;
+        event->value1 = -2;
+        event->data = {1, 2.25f};
+        *result = 0;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus ConfigureParameters(int32_t, const std::vector<int32_t>& params,
+                                           int32_t* result) override {
+        calls.push_back("ConfigureParameters " + std::to_string(params.size()));
+        *result = params.size() == 11 ? 0 : -22;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus SetTorchLightState(int32_t state) override {
+        calls.push_back("SetTorchLightState " + std::to_string(state));
+        return ndk::ScopedAStatus::ok();
+    }
+
+    std::vector<std::string> calls;
+};
+
+// Runs shell input against the fake and returns its output lines.
+class ShellTest : public ::testing::Test {
+  protected:
+    std::vector<std::string> RunLines(const std::vector<std::string>& input) {
+        FILE* out = tmpfile();
+        FILE* err = tmpfile();
+        {
+            LineWriter out_writer(out);
+            LineWriter err_writer(err);
+            Shell shell(service_, &out_writer, &err_writer);
+            for (const auto& line : input) {
+                if (!shell.Execute(line)) break;
+            }
+            shell.ReleaseLeftovers();
+        }
+        std::vector<std::string> lines = ReadLines(out);
+        err_lines_ = ReadLines(err);
+        fclose(out);
+        fclose(err);
+        return lines;
+    }
+
+    static std::vector<std::string> ReadLines(FILE* file) {
+        rewind(file);
+        std::vector<std::string> lines;
+        char buffer[1024];
+        while (fgets(buffer, sizeof(buffer), file)) {
+            std::string line = buffer;
+            if (!line.empty() && line.back() == '\n') line.pop_back();
+            lines.push_back(line);
+        }
+        return lines;
+    }
+
+    std::shared_ptr<FakeService> service_ = ndk::SharedRefBase::make<FakeService>();
+    std::vector<std::string> err_lines_;
+};
+
+TEST(OptionsTest, ParseInt32AcceptsOnlyWholeNumbersInRange) {
+    EXPECT_EQ(ParseInt32("12"), 12);
+    EXPECT_EQ(ParseInt32("-5"), -5);
+    EXPECT_EQ(ParseInt32("0x10"), 16);
+    EXPECT_EQ(ParseInt32("2147483647"), 2147483647);
+    EXPECT_FALSE(ParseInt32("2147483648"));
+    EXPECT_FALSE(ParseInt32(""));
+    EXPECT_FALSE(ParseInt32("12a"));
+    EXPECT_FALSE(ParseInt32(" 1"));
+    EXPECT_FALSE(ParseInt32("abc"));
+}
+
+TEST(OptionsTest, StreamOptions) {
+    StreamOptions options;
+    std::string error;
+    ASSERT_TRUE(ParseStreamOptions(
+        {"range", "--callback", "--period", "100", "--count", "5", "--json"}, &options, &error))
+        << error;
+    EXPECT_EQ(options.mode, kModeRange);
+    EXPECT_TRUE(options.use_callback);
+    EXPECT_EQ(options.period_ms, 100);
+    EXPECT_EQ(options.count, 5);
+    EXPECT_TRUE(options.json);
+
+    StreamOptions bad;
+    EXPECT_FALSE(ParseStreamOptions({"sonar"}, &bad, &error));
+    EXPECT_FALSE(ParseStreamOptions({"als", "--period", "0"}, &bad, &error));
+    EXPECT_FALSE(ParseStreamOptions({"als", "--callback", "--poll"}, &bad, &error));
+    EXPECT_FALSE(ParseStreamOptions({"als", "--count"}, &bad, &error));
+    EXPECT_FALSE(ParseStreamOptions({"als", "--seconds", "-1"}, &bad, &error));
+    EXPECT_FALSE(ParseStreamOptions({"als", "--fast"}, &bad, &error));
+}
+
+TEST(OptionsTest, GlobalTimeoutAnywhere) {
+    GlobalOptions options;
+    std::string error;
+    ASSERT_TRUE(ParseGlobalOptions({"torch", "--timeout", "2.5", "1"}, &options, &error));
+    EXPECT_EQ(options.command, "torch");
+    EXPECT_DOUBLE_EQ(options.timeout_s, 2.5);
+    EXPECT_EQ(options.args, std::vector<std::string>{"1"});
+    GlobalOptions none;
+    EXPECT_FALSE(ParseGlobalOptions({}, &none, &error));
+    EXPECT_FALSE(ParseGlobalOptions({"--timeout", "x", "shell"}, &none, &error));
+}
+
+TEST(EventFormatTest, FloatsReadBackExactly) {
+    EXPECT_EQ(FormatFloat(0.1f), "0.1");
+    EXPECT_EQ(FormatFloat(4294967295.0f), "4.2949673e+09");
+    EXPECT_EQ(FormatFloat(-5), "-5");
+    EXPECT_EQ(strtof(FormatFloat(1.0f / 3).c_str(), nullptr), 1.0f / 3);
+}
+
+Event RangeEvent(int zones) {
+    Event event{};
+    event.data = {100, 1, 2, 3, 4, 5, -6, 7, static_cast<float>(zones), 99};
+    for (int z = 0; z < zones; ++z) {
+        std::vector<float> zone = {static_cast<float>(z), 1000.0f + z, 3, 4, 5, 6, 7, 8, 9, 10, 11};
+        event.data.insert(event.data.end(), zone.begin(), zone.end());
+    }
+    return event;
+}
+
+TEST(EventFormatTest, DecodesRangeZones) {
+    RangeFrame frame = DecodeRange(RangeEvent(2));
+    EXPECT_TRUE(frame.complete);
+    EXPECT_EQ(frame.reported_zones, 2);
+    ASSERT_EQ(frame.zones.size(), 2u);
+    EXPECT_EQ(frame.zones[1].target_status, 1);
+    EXPECT_EQ(frame.zones[1].distance_mm, 1001.0f);
+    EXPECT_EQ(frame.frame_number, 99.0f);
+}
+
+TEST(EventFormatTest, ShortRangeDataIsMarkedIncomplete) {
+    Event event = RangeEvent(2);
+    event.data.resize(25);
+    RangeFrame frame = DecodeRange(event);
+    EXPECT_FALSE(frame.complete);
+    EXPECT_EQ(frame.zones.size(), 1u);
+    EXPECT_NE(FormatEventReadable(kModeRange, event).find("incomplete"), std::string::npos);
+    Event empty{};
+    EXPECT_FALSE(DecodeRange(empty).complete);
+}
+
+TEST(EventFormatTest, AlsJsonNamesTheValues) {
+    Event event{};
+    event.status = 1;
+    event.timestamp = 7;
+    event.value0 = 4500;
+    event.value1 = 120.5f;
+    event.data = {1, 2, 3, 5, 4};
+    EXPECT_EQ(FormatEventJson(kModeAls, 9, event),
+              "{\"sensor\":\"als\",\"handle\":9,\"status\":1,\"timestamp\":7,\"value0\":4500,"
+              "\"value1\":120.5,\"data\":[1,2,3,5,4],\"lux\":120.5,\"color_temperature\":4500,"
+              "\"channels\":[1,2,3,5,4]}");
+}
+
+TEST_F(ShellTest, PrintsOneResultLinePerCommand) {
+    std::vector<std::string> lines =
+        RunLines({"open 3", "enable 42 100", "poll 42", "poll 7", "lowpower 42 1", "disable 42",
+                  "torch 257", "close 42"});
+    ASSERT_EQ(lines.size(), 8u);
+    EXPECT_EQ(lines[0], "open 3 -> 42");
+    EXPECT_EQ(lines[1], "enable 42 100 -> 0");
+    EXPECT_EQ(lines[2], "poll 42 -> 0 status=171 timestamp=123 value0=0.5 value1=-2 data=[1,2.25]");
+    EXPECT_EQ(lines[3], "poll 7 -> -61 (no new sample)");
+    EXPECT_EQ(lines[4], "lowpower 42 1 -> -22 (invalid argument or handle)");
+    EXPECT_EQ(lines[5], "disable 42 -> ok");
+    EXPECT_EQ(lines[6], "torch 257 -> ok");
+    EXPECT_EQ(lines[7], "close 42 -> ok");
+    EXPECT_TRUE(err_lines_.empty());
+}
+
+TEST_F(ShellTest, BadInputGivesAnErrorLineAndGoesOn) {
+    std::vector<std::string> lines =
+        RunLines({"frobnicate", "enable 42", "enable x 100", "open sonar", "lowpower 42 2", "",
+                  "# comment", "open 2", "quit", "open 3"});
+    ASSERT_EQ(lines.size(), 6u);
+    EXPECT_EQ(lines[0], "error: unknown command 'frobnicate' (type 'help' for the list)");
+    EXPECT_EQ(lines[1], "error: wrong number of arguments; usage: enable HANDLE PERIOD_MS");
+    EXPECT_EQ(lines[2], "error: 'x' is not a 32-bit whole number; usage: enable HANDLE PERIOD_MS");
+    EXPECT_EQ(lines[3], "error: 'sonar' is not a mode (1 or als, 3 or range)");
+    EXPECT_EQ(lines[4], "error: lowpower takes 0 or 1, not 2");
+    EXPECT_EQ(lines[5], "open 2 -> -22 (invalid argument or handle)");
+    EXPECT_EQ(service_->calls, std::vector<std::string>{"Open 2"});
+}
+
+TEST_F(ShellTest, ConfigurePassesTheValuesOn) {
+    std::vector<std::string> lines =
+        RunLines({"configure 42 1 2 3 4 1 0 2 5 6 7 8", "configure 42 1 2"});
+    ASSERT_EQ(lines.size(), 2u);
+    EXPECT_EQ(lines[0], "configure 42 1 2 3 4 1 0 2 5 6 7 8 -> 0");
+    EXPECT_EQ(lines[1], "configure 42 1 2 -> -22 (invalid argument or handle)");
+}
+
+TEST_F(ShellTest, HandlesLeftOpenAreDisabledAndClosed) {
+    RunLines({"open 3", "enable 42 50"});
+    EXPECT_EQ(service_->calls,
+              (std::vector<std::string>{"Open 3", "Enable 42 50", "Disable 42", "Close 42"}));
+    ASSERT_EQ(err_lines_.size(), 1u);
+    EXPECT_EQ(err_lines_[0], "releasing handle 42 left open");
+}
+
+}  // namespace
+}  // namespace vyrctl
