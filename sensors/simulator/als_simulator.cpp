@@ -1,0 +1,98 @@
+#include "als_simulator.h"
+
+#include <cerrno>
+#include <chrono>
+
+#include "state_file.h"
+
+namespace sensors_sim {
+namespace {
+
+// How often the sampling thread looks at the enabled flag.
+constexpr std::chrono::milliseconds kWatchInterval{10};
+constexpr uint8_t kStatusOk = 0;
+constexpr uint8_t kStatusInvalid = 1;
+constexpr uint8_t kStatusNotEnabled = 2;
+
+}  // namespace
+
+AlsSimulator::AlsSimulator(const Scenario& scenario, const std::atomic<bool>* enabled)
+    : scenario_(scenario), scene_(scenario.seed), enabled_(enabled) {
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        seen_enabled_ = enabled_->load();
+        PublishLocked();
+    }
+    watcher_ = std::thread(&AlsSimulator::WatchEnabled, this);
+}
+
+AlsSimulator::~AlsSimulator() {
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        stopping_ = true;
+    }
+    stop_.notify_all();
+    watcher_.join();
+    StateFile::Get().Set({{"als.created", 0}, {"als.enabled", 0}, {"torch", 0}});
+}
+
+int AlsSimulator::ReadSingleShot(ALSResult* result, bool wait, unsigned char integration_ms) {
+    if (result == nullptr) return -EINVAL;
+    uint64_t index;
+    bool torch_lit;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        index = next_index_++;
+        torch_lit = torch_state_ != 0;
+    }
+    if (wait) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(integration_ms) +
+                                    std::chrono::milliseconds(scenario_.extra_latency_ms));
+    }
+    const int64_t now_ns = std::chrono::duration_cast<std::chrono::nanoseconds>(
+                               std::chrono::steady_clock::now().time_since_epoch())
+                               .count();
+    if (!enabled_->load()) {
+        *result = ALSResult{};
+        result->status = kStatusNotEnabled;
+        result->timestamp_ns = now_ns;
+        return -EIO;
+    }
+    *result = scene_.LightSample(index, torch_lit, integration_ms);
+    const bool invalid = scenario_.invalid_every > 0 && (index + 1) % scenario_.invalid_every == 0;
+    result->status = invalid ? kStatusInvalid : kStatusOk;
+    result->reserved = integration_ms;
+    result->valid = invalid ? 0 : 1;
+    result->timestamp_ns = now_ns;
+    return 0;
+}
+
+int AlsSimulator::Disable() {
+    // Powering down only saves energy; the next read powers the part up again.
+    return 0;
+}
+
+int AlsSimulator::SetTorchLightState(unsigned char state) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    torch_state_ = state;
+    PublishLocked();
+    return 0;
+}
+
+void AlsSimulator::WatchEnabled() {
+    std::unique_lock<std::mutex> lock(mutex_);
+    while (!stop_.wait_for(lock, kWatchInterval, [this] { return stopping_; })) {
+        const bool enabled = enabled_->load();
+        if (enabled != seen_enabled_) {
+            seen_enabled_ = enabled;
+            PublishLocked();
+        }
+    }
+}
+
+void AlsSimulator::PublishLocked() {
+    StateFile::Get().Set(
+        {{"als.created", 1}, {"als.enabled", seen_enabled_ ? 1 : 0}, {"torch", torch_state_}});
+}
+
+}  // namespace sensors_sim

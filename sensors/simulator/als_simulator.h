@@ -1,0 +1,45 @@
+#pragma once
+
+#include <atomic>
+#include <condition_variable>
+#include <cstdint>
+#include <mutex>
+#include <thread>
+
+#include "ambient_light_sensor.h"
+#include "sensors_sim/scenario.h"
+#include "sensors_sim/scene_model.h"
+
+namespace sensors_sim {
+
+// A spectral light sensor that integrates for the requested time per single-shot read. Like the
+// real library it watches the owner's enabled flag on a sampling thread of its own.
+class AlsSimulator {
+  public:
+    AlsSimulator(const Scenario& scenario, const std::atomic<bool>* enabled);
+    ~AlsSimulator();
+    AlsSimulator(const AlsSimulator&) = delete;
+    AlsSimulator& operator=(const AlsSimulator&) = delete;
+
+    int ReadSingleShot(ALSResult* result, bool wait, unsigned char integration_ms);
+    int Disable();
+    int SetTorchLightState(unsigned char state);
+
+  private:
+    void WatchEnabled();
+    void PublishLocked();
+
+    const Scenario scenario_;
+    const SceneModel scene_;
+    const std::atomic<bool>* const enabled_;
+
+    std::mutex mutex_;
+    std::condition_variable stop_;
+    bool stopping_ = false;
+    bool seen_enabled_ = false;
+    unsigned char torch_state_ = 0;
+    uint64_t next_index_ = 0;
+    std::thread watcher_;
+};
+
+}  // namespace sensors_sim

@@ -1,0 +1,48 @@
+#pragma once
+
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <map>
+#include <string>
+
+// A private directory for one test's files, removed with everything in it.
+class TempDir {
+  public:
+    TempDir() {
+        char path[] = "/tmp/vyr_sensors_XXXXXX";
+        if (mkdtemp(path) == nullptr) ADD_FAILURE() << "mkdtemp failed";
+        path_ = path;
+    }
+    ~TempDir() {
+        std::error_code ignored;
+        std::filesystem::remove_all(path_, ignored);
+    }
+    TempDir(const TempDir&) = delete;
+    TempDir& operator=(const TempDir&) = delete;
+
+    std::string Write(const std::string& name, const std::string& contents) const {
+        const std::string file = path_ + "/" + name;
+        std::ofstream(file, std::ios::trunc) << contents;
+        return file;
+    }
+    std::string Path(const std::string& name) const { return path_ + "/" + name; }
+
+  private:
+    std::string path_;
+};
+
+// `key=value` lines of a file; empty when it cannot be read.
+inline std::map<std::string, std::string> ReadKeyValues(const std::string& path) {
+    std::map<std::string, std::string> values;
+    std::ifstream file(path);
+    std::string line;
+    while (std::getline(file, line)) {
+        const size_t equals = line.find('=');
+        if (equals != std::string::npos) values[line.substr(0, equals)] = line.substr(equals + 1);
+    }
+    return values;
+}
