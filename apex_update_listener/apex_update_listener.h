@@ -1,0 +1,78 @@
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <set>
+#include <string>
+#include <thread>
+
+// Watches the APEX info list for changes to the records of one package and reports each change
+// to a callback on a thread of its own.
+class ApexUpdateListener {
+  public:
+    // One "apex-info" entry of the list.
+    struct Info {
+        std::string module_name;
+        std::string module_path;
+        std::string preinstalled_module_path;
+        int64_t version_code = 0;
+        std::string version_name;
+        bool is_factory = false;
+        bool is_active = false;
+
+        // Orders by state first (a factory-only record before an active one), then version, then
+        // paths and name.
+        bool operator<(const Info& other) const;
+    };
+
+    // Called with the records seen before and after a change.
+    using Callback = std::function<void(const std::set<Info>&, const std::set<Info>&)>;
+
+    // Pass key: only Make builds listeners.
+    class Sigil {
+      private:
+        // explicit keeps the type from being an aggregate, so `{}` cannot stand in for a key.
+        explicit Sigil() = default;
+        friend class ApexUpdateListener;
+        // Tests feed the thread event records through a socket in place of the inotify instance.
+        friend class ApexUpdateListenerTestPeer;
+    };
+
+    ApexUpdateListener(Sigil, const std::string& package, const std::string& path, Callback callback,
+                       int inotify_fd, int watch_descriptor, const std::set<Info>& initial_info);
+    virtual ~ApexUpdateListener();
+
+    ApexUpdateListener(const ApexUpdateListener&) = delete;
+    ApexUpdateListener& operator=(const ApexUpdateListener&) = delete;
+
+    // Watches `path` for changes to the records of `package`. Returns null (and logs why) on
+    // failure. With `invoke_with_initial_version` the callback first sees an empty old set and
+    // the current records, on the caller's thread, before this returns.
+    static std::unique_ptr<ApexUpdateListener> Make(const std::string& package, Callback callback,
+                                                    bool invoke_with_initial_version,
+                                                    const std::string& path);
+
+    // Reads the records of `package` from the info list at `path`; no value (logged) when the
+    // file cannot be parsed or holds none.
+    static std::optional<std::set<Info>> TrySlurpInfo(const std::string& package,
+                                                      const std::string& path);
+
+  private:
+    void ThreadFunction();
+    // Logs one event and re-reads the list when the event calls for it.
+    void HandleEvent(uint32_t mask);
+    // Compares the list's records with current_info_ and reports a difference.
+    void CheckForUpdate();
+
+    const std::string package_name_;
+    const std::string info_list_path_;
+    Callback callback_;
+    std::atomic<bool> running_;
+    int32_t inotify_fd_;
+    int32_t watch_descriptor_;
+    std::set<Info> current_info_;
+    std::thread thread_;
+};

@@ -1,0 +1,10 @@
+#pragma once
+
+#include <set>
+
+namespace apex_test {
+
+// The process's open inotify instances, by descriptor.
+std::set<int> InotifyDescriptors();
+
+}  // namespace apex_test
