@@ -1,0 +1,25 @@
+#pragma once
+
+#include <android/binder_ibinder.h>
+#include <android/binder_status.h>
+
+__BEGIN_DECLS
+
+// Publishes a binder under a name. EX_NONE on success, else an exception code
+// (EX_ILLEGAL_ARGUMENT for a bad name or binder, EX_ILLEGAL_STATE when the name is held by
+// another live process or the registry cannot be written).
+__attribute__((warn_unused_result)) binder_exception_t AServiceManager_addService(
+    AIBinder* binder, const char* instance) __INTRODUCED_IN(29);
+
+// The binder published under the name, with a strong reference for the caller, or null.
+// checkService answers at once; getService waits a short bounded time for the name to appear;
+// waitForService waits until it does.
+__attribute__((warn_unused_result)) AIBinder* AServiceManager_checkService(const char* instance)
+    __INTRODUCED_IN(29);
+__attribute__((warn_unused_result)) AIBinder* AServiceManager_getService(const char* instance)
+    __INTRODUCED_IN(29);
+__attribute__((warn_unused_result)) AIBinder* AServiceManager_waitForService(const char* instance)
+    __INTRODUCED_IN(31);
+bool AServiceManager_isDeclared(const char* instance) __INTRODUCED_IN(31);
+
+__END_DECLS

@@ -1,0 +1,12 @@
+#pragma once
+
+#include <sys/cdefs.h>
+
+__BEGIN_DECLS
+
+// Host runtime only: closes every connection (peers see this process's objects die), removes
+// this process's registry entries, makes joinThreadPool return and joins every runtime thread.
+// The runtime starts afresh on the next binder call. Must not be called from a runtime thread.
+void VyrBinder_shutdown(void);
+
+__END_DECLS

@@ -1,0 +1,52 @@
+#pragma once
+
+#include <android/binder_ibinder.h>
+
+#include <atomic>
+#include <memory>
+#include <mutex>
+#include <vector>
+
+namespace vyr_binder {
+
+class RefCounts;
+
+// The shared part of an AIBinder_DeathRecipient: links hold it, so a notice in flight outlives
+// the handle.
+class DeathRecipientState {
+  public:
+    explicit DeathRecipientState(AIBinder_DeathRecipient_onBinderDied on_died)
+        : on_died_(on_died) {}
+    ~DeathRecipientState();
+
+    void SetOnUnlinked(AIBinder_DeathRecipient_onBinderUnlinked on_unlinked) {
+        on_unlinked_.store(on_unlinked, std::memory_order_release);
+    }
+    // Records a binder this recipient was linked to, so deletion can unlink it.
+    void Remember(AIBinder* binder);
+    // Unlinks from every remembered binder; no notice is delivered after this returns.
+    void Delete();
+
+    bool deleted() const { return deleted_.load(std::memory_order_acquire); }
+    void NotifyDied(void* cookie) const;
+    void NotifyUnlinked(void* cookie) const;
+
+  private:
+    const AIBinder_DeathRecipient_onBinderDied on_died_;
+    std::atomic<AIBinder_DeathRecipient_onBinderUnlinked> on_unlinked_{nullptr};
+    std::atomic<bool> deleted_{false};
+    std::mutex mutex_;
+    std::vector<RefCounts*> binders_;  // weak references
+};
+
+// One link: a recipient and the cookie it was linked with.
+struct DeathLink {
+    std::shared_ptr<DeathRecipientState> recipient;
+    void* cookie;
+};
+
+}  // namespace vyr_binder
+
+struct AIBinder_DeathRecipient {
+    std::shared_ptr<vyr_binder::DeathRecipientState> state;
+};

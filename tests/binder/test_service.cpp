@@ -1,0 +1,105 @@
+#include "test_service.h"
+
+#include <android/binder_ibinder.h>
+
+#include <chrono>
+
+namespace vyr_binder_test {
+
+ndk::ScopedAStatus TestService::Open(int32_t mode, int32_t* result) {
+    *result = mode * 10;
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::Close(int32_t /*handle*/) {
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::Enable(int32_t handle, int32_t period, int32_t* result) {
+    *result = handle + period;
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::Disable(int32_t handle) {
+    if (handle < 0) return ndk::ScopedAStatus::fromServiceSpecificErrorWithMessage(handle, "neg");
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::SetCallback(int32_t handle,
+                                            const std::shared_ptr<IEventCallback>& callback,
+                                            int32_t* result) {
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        callback_ = callback;
+    }
+    *result = callback == nullptr ? -22 : handle;
+    // A positive handle asks for that many events to be delivered before returning: a call back
+    // into the caller while it waits for this reply.
+    for (int32_t i = 0; callback != nullptr && i < handle; ++i) {
+        ndk::ScopedAStatus status = callback->OnEvent(MakeEvent(i));
+        if (!status.isOk()) {
+            *result = status.getStatus();
+            break;
+        }
+    }
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::EnableLowPower(int32_t /*handle*/, bool enable, int32_t* result) {
+    *result = enable ? 1 : 0;
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::PollOnce(int32_t handle, Event* event, int32_t* result) {
+    *event = MakeEvent(handle);
+    *result = static_cast<int32_t>(AIBinder_getCallingPid());
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::ConfigureParameters(int32_t /*handle*/,
+                                                    const std::vector<int32_t>& params,
+                                                    int32_t* result) {
+    int32_t sum = 0;
+    for (int32_t p : params) sum += p;
+    *result = sum;
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::SetTorchLightState(int32_t state) {
+    torch_state_ = state;
+    return ndk::ScopedAStatus::ok();
+}
+
+std::shared_ptr<IEventCallback> TestService::callback() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return callback_;
+}
+
+ndk::ScopedAStatus RecordingCallback::OnEvent(const Event& event) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    events_.push_back(event);
+    cv_.notify_all();
+    return ndk::ScopedAStatus::ok();
+}
+
+bool RecordingCallback::WaitForEvents(size_t count) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    return cv_.wait_for(lock, std::chrono::seconds(10), [&] { return events_.size() >= count; });
+}
+
+std::vector<Event> RecordingCallback::events() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return events_;
+}
+
+Event MakeEvent(int32_t handle) {
+    Event event;
+    event.status = static_cast<int8_t>(handle);
+    event.timestamp = 1000000000000LL + handle;
+    event.value0 = 1.5f * static_cast<float>(handle);
+    event.value1 = -2.25f;
+    event.data.assign(static_cast<size_t>(handle % 7), 0.5f);
+    return event;
+}
+
+}  // namespace vyr_binder_test

@@ -1,0 +1,59 @@
+#pragma once
+
+#include <aidl/android/vyr/BnEventCallback.h>
+#include <aidl/android/vyr/BnVYRService.h>
+
+#include <atomic>
+#include <condition_variable>
+#include <mutex>
+#include <vector>
+
+namespace vyr_binder_test {
+
+using aidl::android::vyr::BnEventCallback;
+using aidl::android::vyr::BnVYRService;
+using aidl::android::vyr::Event;
+using aidl::android::vyr::IEventCallback;
+
+// A small IVYRService whose results tell what it received, for round trips through the runtime.
+class TestService : public BnVYRService {
+  public:
+    ndk::ScopedAStatus Open(int32_t mode, int32_t* result) override;
+    ndk::ScopedAStatus Close(int32_t handle) override;
+    ndk::ScopedAStatus Enable(int32_t handle, int32_t period, int32_t* result) override;
+    ndk::ScopedAStatus Disable(int32_t handle) override;
+    ndk::ScopedAStatus SetCallback(int32_t handle, const std::shared_ptr<IEventCallback>& callback,
+                                   int32_t* result) override;
+    ndk::ScopedAStatus EnableLowPower(int32_t handle, bool enable, int32_t* result) override;
+    ndk::ScopedAStatus PollOnce(int32_t handle, Event* event, int32_t* result) override;
+    ndk::ScopedAStatus ConfigureParameters(int32_t handle, const std::vector<int32_t>& params,
+                                           int32_t* result) override;
+    ndk::ScopedAStatus SetTorchLightState(int32_t state) override;
+
+    std::shared_ptr<IEventCallback> callback();
+    int32_t last_torch_state() const { return torch_state_.load(); }
+
+  private:
+    std::mutex mutex_;
+    std::shared_ptr<IEventCallback> callback_;
+    std::atomic<int32_t> torch_state_{-1};
+};
+
+// Records the events it receives.
+class RecordingCallback : public BnEventCallback {
+  public:
+    ndk::ScopedAStatus OnEvent(const Event& event) override;
+    // Waits up to 10 s for `count` events.
+    bool WaitForEvents(size_t count);
+    std::vector<Event> events();
+
+  private:
+    std::mutex mutex_;
+    std::condition_variable cv_;
+    std::vector<Event> events_;
+};
+
+// The event PollOnce(handle) returns.
+Event MakeEvent(int32_t handle);
+
+}  // namespace vyr_binder_test
