@@ -14,8 +14,7 @@ bool g_active = false;
 
 void CaptureLogger(const __android_logger_data* data, const char* message) {
     LogRecord record{data->tag ? data->tag : "", data->priority, message ? message : ""};
-    fprintf(stderr, "[log %d %s] %s\n", record.priority, record.tag.c_str(),
-            record.message.c_str());
+    fprintf(stderr, "[log %d %s] %s\n", record.priority, record.tag.c_str(), record.message.c_str());
     std::lock_guard<std::mutex> lock(g_mutex);
     if (!g_active) return;
     g_records.push_back(std::move(record));

@@ -1,0 +1,80 @@
+# shellcheck shell=bash
+# The Debian 12 packages this project needs, and a function that installs the missing ones.
+# Sourced by scripts/test and scripts/demo; running it alone installs them:
+#   bash scripts/deps.sh
+
+VYR_DEBIAN_PACKAGES=(
+    # Build
+    cmake
+    ninja-build
+    g++
+    git
+    aidl
+    # Platform libraries the service is written against
+    android-liblog-dev
+    android-libbase-dev
+    android-libcutils-dev
+    libtinyxml2-dev
+    # Tests and benchmarks
+    googletest
+    libgtest-dev
+    libgmock-dev
+    libbenchmark-dev
+    # unshare and nsenter, for the tests that run processes in their own namespaces
+    util-linux
+    # The fuzz preset (libFuzzer comes with clang's runtime libraries) and the format check
+    clang
+    libclang-rt-14-dev
+    clang-format
+)
+
+# Prints the packages of VYR_DEBIAN_PACKAGES that are not installed, one per line.
+vyr_missing_packages() {
+    local package
+    for package in "${VYR_DEBIAN_PACKAGES[@]}"; do
+        if [[ "$(dpkg-query -W -f='${Status}' "$package" 2>/dev/null)" != "install ok installed" ]]; then
+            echo "$package"
+        fi
+    done
+}
+
+# Installs whatever is missing with apt-get, as root or through sudo, without asking anything.
+vyr_install_deps() {
+    if ! command -v dpkg-query >/dev/null 2>&1 || ! command -v apt-get >/dev/null 2>&1; then
+        echo "deps: this is not a Debian system; install the equivalents of:" >&2
+        echo "  ${VYR_DEBIAN_PACKAGES[*]}" >&2
+        return 1
+    fi
+    local missing
+    mapfile -t missing < <(vyr_missing_packages)
+    if ((${#missing[@]} == 0)); then
+        return 0
+    fi
+    echo "deps: installing ${missing[*]}"
+    local -a as_root=()
+    if ((EUID != 0)); then
+        if ! command -v sudo >/dev/null 2>&1; then
+            echo "deps: not root and no sudo; as root run:" >&2
+            echo "  apt-get update && apt-get install -y ${missing[*]}" >&2
+            return 1
+        fi
+        # Without a terminal sudo must not wait for a password that nobody can type.
+        if [[ -t 0 ]]; then as_root=(sudo); else as_root=(sudo -n); fi
+    fi
+    local -a apt=("${as_root[@]}" env DEBIAN_FRONTEND=noninteractive apt-get -q -y
+                  -o Dpkg::Options::=--force-confdef -o Dpkg::Options::=--force-confold)
+    "${apt[@]}" update </dev/null &&
+        "${apt[@]}" install --no-install-recommends "${missing[@]}" </dev/null || {
+        echo "deps: apt-get failed" >&2
+        return 1
+    }
+    mapfile -t missing < <(vyr_missing_packages)
+    if ((${#missing[@]} != 0)); then
+        echo "deps: still missing after apt-get: ${missing[*]}" >&2
+        return 1
+    fi
+}
+
+if [[ "${BASH_SOURCE[0]}" == "$0" ]]; then
+    vyr_install_deps
+fi
