@@ -56,11 +56,13 @@ ApexUpdateListener::~ApexUpdateListener() {
     if (watch_descriptor_ >= 0) {
         inotify_rm_watch(inotify_fd_, watch_descriptor_);
     }
-    if (inotify_fd_ >= 0) {
-        close(inotify_fd_);
-    }
+    // Join before closing: closing does not wake a blocked read on Linux, and until the thread
+    // has returned it may still read the descriptor, whose number another open could reuse.
     if (thread_.joinable()) {
         thread_.join();
+    }
+    if (inotify_fd_ >= 0) {
+        close(inotify_fd_);
     }
 }
 

@@ -210,18 +210,25 @@ TEST_F(TrySlurpInfoTest, EmptyListFails) {
 }
 
 TEST_F(TrySlurpInfoTest, EntriesOutsideTheListLevelAreNotVisited) {
+    const std::string name = "moduleName=\"" + std::string(kPackage) + "\"";
     auto infos = Slurp(
         "<apex-info-list>\n"
-        "  <group><apex-info moduleName=\"" +
-        std::string(kPackage) +
-        "\" versionCode=\"9\"/></group>\n"
-        "  <apex-info moduleName=\"" +
-        std::string(kPackage) + "\" versionCode=\"1\"><apex-info moduleName=\"" +
-        std::string(kPackage) +
-        "\" versionCode=\"8\"/></apex-info>\n"
-        "  <apex-infos moduleName=\"" +
-        std::string(kPackage) +
-        "\" versionCode=\"7\"/>\n"
+        "  <apex-infos " +
+        name +
+        " versionCode=\"7\"/>\n"
+        "  <group><apex-info " +
+        name +
+        " versionCode=\"9\"/></group>\n"
+        "  <apex-info " +
+        name +
+        " versionCode=\"1\">\n"
+        "    <apex-info " +
+        name +
+        " versionCode=\"8\"/>\n"
+        "  </apex-info>\n"
+        "  <info " +
+        name +
+        " versionCode=\"6\"/>\n"
         "</apex-info-list>\n");
     ASSERT_TRUE(infos.has_value());
     EXPECT_EQ(Fields(*infos), (std::vector<InfoFields>{{kPackage, "", "", 1, "", false, false}}));
