@@ -1,0 +1,44 @@
+#pragma once
+
+#include <sys/types.h>
+
+#include <string>
+#include <vector>
+
+namespace vyr_sandbox {
+
+// Exit statuses of the sandbox itself (the command's own status is forwarded otherwise).
+inline constexpr int kExitNoPrivilege = 77;
+inline constexpr int kExitSetupFailed = 125;
+inline constexpr int kExitExecFailed = 127;
+
+struct SandboxOptions {
+    std::string panel;          // initial content of the backlight state attribute
+    std::string apex_dir;       // host directory shown as /apex
+    std::string property_file;  // exported as VYR_PROPERTY_FILE when not empty
+    std::vector<std::string> command;
+};
+
+// Runs one command in private mount and UTS namespaces and relays control commands from stdin
+// until the command ends; the command's exit status becomes the sandbox's.
+class Supervisor {
+  public:
+    explicit Supervisor(SandboxOptions options) : options_(std::move(options)) {}
+
+    int Run();
+
+  private:
+    pid_t StartCommand();
+    // Handles one control line; false when the caller asked to end the command.
+    bool HandleLine(const std::string& line);
+    int WaitForCommand(int signal_fd);
+    int Terminate(int signal_fd);
+
+    SandboxOptions options_;
+    pid_t child_ = -1;
+};
+
+// Sets the backlight state of the sandbox that contains process `pid`.
+int SetPanelOf(pid_t pid, const std::string& state);
+
+}  // namespace vyr_sandbox
