@@ -1,7 +1,7 @@
 // vyr-sandbox: runs the unmodified service binary with the device paths it expects, backed by
 // things the caller controls.
 //
-//   vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] -- COMMAND [ARG...]
+//   vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] [--no-stdin] -- COMMAND [ARG...]
 //   vyr-sandbox panel PID STATE
 //
 // `run` starts COMMAND in private mount and UTS namespaces in which
@@ -13,11 +13,12 @@
 // It prints "pid N" once the command runs, then reads commands from stdin, one per line:
 //   panel STATE   set the state attribute (answered with "ok" or "error ...")
 //   quit          end the command (SIGTERM, SIGKILL after 5 s)
-// End of stdin, SIGTERM, SIGINT and SIGHUP end the command too. When the command has ended it
-// prints "exit S" and exits with S: the command's exit code, or 128 + the signal that killed it.
-// The command's stdout is sent to stderr so that stdout carries only the lines above.
-// Statuses of its own: 77 without the privilege to create namespaces, 125 when setting up
-// fails, 127 when COMMAND cannot be run.
+// End of stdin, SIGTERM, SIGINT and SIGHUP end the command too. With --no-stdin, stdin is not
+// read (for runs in the background); use `vyr-sandbox panel` and signals instead. When the command
+// has ended it prints "exit S" and exits with S: the command's exit code, or 128 + the signal that
+// killed it. The command's stdout is sent to stderr so that stdout carries only the lines above. Statuses
+// of its own: 77 without the privilege to create namespaces, 125 when setting up fails, 127 when
+// COMMAND cannot be run.
 //
 // `panel` sets the state of the sandbox that contains process PID (the sandbox or its command).
 //
@@ -41,8 +42,8 @@ constexpr char kApexListName[] = "apex-info-list.xml";
 
 int Usage() {
     fprintf(stderr,
-            "usage: vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] -- COMMAND "
-            "[ARG...]\n"
+            "usage: vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] [--no-stdin] -- "
+            "COMMAND [ARG...]\n"
             "       vyr-sandbox panel PID STATE\n");
     return 2;
 }
@@ -66,6 +67,11 @@ int Run(int argc, char** argv) {
     options.panel = "Off";
     int i = 2;
     for (; i < argc && strcmp(argv[i], "--") != 0; i += 2) {
+        if (strcmp(argv[i], "--no-stdin") == 0) {
+            options.read_stdin = false;
+            --i;
+            continue;
+        }
         if (i + 1 >= argc) return Usage();
         if (strcmp(argv[i], "--panel") == 0) {
             options.panel = argv[i + 1];

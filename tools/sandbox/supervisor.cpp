@@ -142,7 +142,7 @@ bool Supervisor::HandleLine(const std::string& line) {
 
 int Supervisor::WaitForCommand(int signal_fd) {
     std::string pending;
-    bool stdin_open = true;
+    bool stdin_open = options_.read_stdin;
     while (true) {
         pollfd fds[2] = {{signal_fd, POLLIN, 0}, {STDIN_FILENO, POLLIN, 0}};
         if (poll(fds, stdin_open ? 2 : 1, -1) < 0) {

@@ -16,6 +16,7 @@ struct SandboxOptions {
     std::string panel;          // initial content of the backlight state attribute
     std::string apex_dir;       // host directory shown as /apex
     std::string property_file;  // exported as VYR_PROPERTY_FILE when not empty
+    bool read_stdin = true;     // control commands come from stdin; its end ends the command
     std::vector<std::string> command;
 };
 
