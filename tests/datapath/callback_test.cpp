@@ -31,7 +31,7 @@ MultiRangingData Frame(uint32_t time_ms) {
 class CallbackTest : public InProcessServiceTest {
   protected:
     std::shared_ptr<RecordingCallback> SetCallbackOk(int32_t handle) {
-        auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+        auto callback = NewCallback();
         int32_t result = 1;
         EXPECT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
         EXPECT_EQ(result, 0);
@@ -46,7 +46,7 @@ TEST_F(CallbackTest, CallbackOfAnEnabledClientCannotBeReplaced) {
     StartHeldSampling(handle, kRange);
     ASSERT_TRUE(first->WaitForEvents(1, kWait));
 
-    auto second = ndk::SharedRefBase::make<RecordingCallback>();
+    auto second = NewCallback();
     int32_t result = 0;
     EXPECT_TRUE(service_->SetCallback(handle, second, &result).isOk());
     EXPECT_EQ(result, -1);

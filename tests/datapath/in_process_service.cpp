@@ -45,7 +45,14 @@ void InProcessServiceTest::TearDown() {
     for (int32_t handle : opened_) service_->Close(handle);
     WaitForIdleWorkers();
     service_.reset();
+    callback_binders_.clear();
     log_.reset();
+}
+
+std::shared_ptr<RecordingCallback> InProcessServiceTest::NewCallback() {
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    callback_binders_.push_back(callback->asBinder());
+    return callback;
 }
 
 int32_t InProcessServiceTest::OpenOk(int32_t mode) {

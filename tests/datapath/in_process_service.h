@@ -11,8 +11,10 @@
 #include <cstdint>
 #include <memory>
 #include <set>
+#include <vector>
 
 #include "log_capture.h"
+#include "recording_callback.h"
 #include "sensor_doubles.h"
 #include "vyrservice.h"
 
@@ -49,12 +51,18 @@ class InProcessServiceTest : public ::testing::Test {
 
     static const char* ReadCallOf(int32_t mode);
 
+    // A callback whose binder this fixture keeps alive. The service holds a callback's binder
+    // without a reference of its own, counting on the callback to keep it, which a remote proxy
+    // does and a local object does not.
+    std::shared_ptr<RecordingCallback> NewCallback();
+
     std::unique_ptr<vyr_test::LogCapture> log_;
     std::shared_ptr<android::vyr::binder::VYRService> service_;
 
   private:
     std::set<int32_t> opened_;
     std::set<int32_t> enabled_;
+    std::vector<ndk::SpAIBinder> callback_binders_;
     const char* held_call_ = nullptr;
 };
 
