@@ -2,6 +2,7 @@
 #include <apex_update_listener.h>
 #include <gtest/gtest.h>
 #include <log_capture.h>
+#include <sys/stat.h>
 #include <tinyxml2.h>
 
 #include <chrono>
@@ -197,6 +198,17 @@ TEST_F(ListenerLiveTest, UnparsableFileIsLoggedAndNextWriteIsPickedUp) {
                              "XML parsing failed: " + std::to_string(error), kDeadline));
     ExpectOnlyCallbackIsSentinel({ActiveInfo(kPackage, 1)});
     EXPECT_EQ(ListenerErrors(), 1u);
+}
+
+TEST_F(ListenerLiveTest, AttributeChangesAndReadsAreNotWatched) {
+    ASSERT_EQ(chmod(list_.path().c_str(), 0600), 0);
+    ASSERT_EQ(ApexUpdateListener::TrySlurpInfo(kPackage, list_.path()).has_value(), true);
+    ASSERT_TRUE(observer_->WaitForRead(kDeadline));
+    ExpectOnlyCallbackIsSentinel({ActiveInfo(kPackage, 1)});
+    // The sentinel's write is the only event that made the listener read the list again.
+    EXPECT_TRUE(observer_->WaitForRead(kDeadline));
+    EXPECT_FALSE(observer_->WaitForRead(0ms));
+    EXPECT_EQ(log_.Count(kLogTag, ANDROID_LOG_INFO, Modified()), 1u);
 }
 
 TEST_F(ListenerLiveTest, DestructionWithNothingPendingIsPromptAndSilent) {
