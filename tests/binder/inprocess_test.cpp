@@ -3,7 +3,9 @@
 #include <android/binder_process.h>
 #include <gtest/gtest.h>
 #include <unistd.h>
+#include <vyr/binder_host.h>
 
+#include "binder_test_env.h"
 #include "test_service.h"
 
 namespace {
@@ -128,6 +130,7 @@ TEST(InProcessTest, DeathLinksOnLocalBinderAreRefused) {
 }
 
 TEST(InProcessTest, ServiceLookedUpInItsOwnProcessIsTheLocalObject) {
+    vyr_binder_test::ScopedRegistryDir registry;
     auto service = ndk::SharedRefBase::make<TestService>();
     ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "inprocess.test"));
     ndk::SpAIBinder found(AServiceManager_checkService("inprocess.test"));
@@ -137,6 +140,7 @@ TEST(InProcessTest, ServiceLookedUpInItsOwnProcessIsTheLocalObject) {
     EXPECT_EQ(found.get(), got.get());
     EXPECT_NE(EX_NONE, AServiceManager_addService(service->asBinder().get(), "bad name!"));
     EXPECT_NE(EX_NONE, AServiceManager_addService(nullptr, "inprocess.null"));
+    VyrBinder_shutdown();
 }
 
 TEST(InProcessTest, WeakReferencePromotesOnlyWhileAlive) {

@@ -1,17 +1,30 @@
 #include "test_service.h"
 
 #include <android/binder_ibinder.h>
+#include <unistd.h>
 
 #include <chrono>
 
 namespace vyr_binder_test {
 
+TestService::~TestService() {
+    for (std::thread& sender : senders_) sender.join();
+}
+
 ndk::ScopedAStatus TestService::Open(int32_t mode, int32_t* result) {
-    *result = mode * 10;
+    *result = mode == kQueryTorch ? torch_state_.load() : mode * 10;
     return ndk::ScopedAStatus::ok();
 }
 
-ndk::ScopedAStatus TestService::Close(int32_t /*handle*/) {
+ndk::ScopedAStatus TestService::Close(int32_t handle) {
+    std::shared_ptr<IEventCallback> callback = this->callback();
+    if (handle <= 0 || callback == nullptr) return ndk::ScopedAStatus::ok();
+    std::lock_guard<std::mutex> lock(mutex_);
+    senders_.emplace_back([callback, handle] {
+        for (int32_t i = 0; i < handle; ++i) {
+            if (!callback->OnEvent(MakeEvent(i)).isOk()) return;
+        }
+    });
     return ndk::ScopedAStatus::ok();
 }
 
@@ -45,7 +58,11 @@ ndk::ScopedAStatus TestService::SetCallback(int32_t handle,
     return ndk::ScopedAStatus::ok();
 }
 
-ndk::ScopedAStatus TestService::EnableLowPower(int32_t /*handle*/, bool enable, int32_t* result) {
+ndk::ScopedAStatus TestService::EnableLowPower(int32_t handle, bool enable, int32_t* result) {
+    if (handle == kBlockForever) {
+        // Stands for a service stuck in a call; only the caller's death ends the wait for it.
+        for (;;) pause();
+    }
     *result = enable ? 1 : 0;
     return ndk::ScopedAStatus::ok();
 }

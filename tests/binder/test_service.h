@@ -6,6 +6,7 @@
 #include <atomic>
 #include <condition_variable>
 #include <mutex>
+#include <thread>
 #include <vector>
 
 namespace vyr_binder_test {
@@ -16,8 +17,14 @@ using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 
 // A small IVYRService whose results tell what it received, for round trips through the runtime.
+// Open(kQueryTorch) returns the last torch state; Close(n > 0) delivers n events to the stored
+// callback from another thread; EnableLowPower(kBlockForever, ...) never returns.
 class TestService : public BnVYRService {
   public:
+    static constexpr int32_t kQueryTorch = -100;
+    static constexpr int32_t kBlockForever = 999;
+
+    ~TestService() override;
     ndk::ScopedAStatus Open(int32_t mode, int32_t* result) override;
     ndk::ScopedAStatus Close(int32_t handle) override;
     ndk::ScopedAStatus Enable(int32_t handle, int32_t period, int32_t* result) override;
@@ -36,6 +43,7 @@ class TestService : public BnVYRService {
   private:
     std::mutex mutex_;
     std::shared_ptr<IEventCallback> callback_;
+    std::vector<std::thread> senders_;
     std::atomic<int32_t> torch_state_{-1};
 };
 

@@ -1,8 +1,18 @@
 #include "process_state.h"
 
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
 #include <vyr/binder_host.h>
 
-#include <utility>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <random>
+
+#include "connection.h"
+#include "listener.h"
+#include "registry.h"
 
 namespace vyr_binder {
 
@@ -11,9 +21,16 @@ ProcessState& ProcessState::Get() {
     return *state;
 }
 
-void ProcessState::AddLocalService(const std::string& name, const ndk::SpAIBinder& binder) {
-    std::lock_guard<std::mutex> lock(services_mutex_);
-    services_[name] = binder;
+std::string ProcessState::key() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    if (key_.empty()) {
+        std::random_device random;
+        char buffer[64];
+        snprintf(buffer, sizeof(buffer), "p%d-%08x%08x", static_cast<int>(getpid()), random(),
+                 random());
+        key_ = buffer;
+    }
+    return key_;
 }
 
 ndk::SpAIBinder ProcessState::FindLocalService(const std::string& name) {
@@ -22,13 +39,204 @@ ndk::SpAIBinder ProcessState::FindLocalService(const std::string& name) {
     return it == services_.end() ? ndk::SpAIBinder() : it->second;
 }
 
+binder_exception_t ProcessState::Publish(const std::string& name, const ndk::SpAIBinder& binder) {
+    std::string dir;
+    if (!Registry::Dir(&dir)) return EX_ILLEGAL_STATE;
+    std::string own_key = key();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (shutting_down_ || !EnsureListenerLocked(dir)) return EX_ILLEGAL_STATE;
+    }
+    // Known locally first, so a peer that sees the name can already look it up.
+    ndk::SpAIBinder previous;
+    {
+        std::lock_guard<std::mutex> lock(services_mutex_);
+        auto it = services_.find(name);
+        if (it != services_.end()) previous = it->second;
+        services_[name] = binder;
+    }
+    binder_exception_t result = Registry::Publish(dir, name, own_key);
+    if (result != EX_NONE) {
+        std::lock_guard<std::mutex> lock(services_mutex_);
+        if (previous.get() != nullptr) {
+            services_[name] = previous;
+        } else {
+            services_.erase(name);
+        }
+        return result;
+    }
+    std::lock_guard<std::mutex> lock(mutex_);
+    published_.emplace_back(dir, name);
+    return EX_NONE;
+}
+
+bool ProcessState::EnsureListenerLocked(const std::string& dir) {
+    if (listeners_.count(dir) != 0) return true;
+    if (key_.empty()) return false;
+    std::unique_ptr<Listener> listener = Listener::Create(dir, key_);
+    if (listener == nullptr) return false;
+    static std::once_flag at_exit_once;
+    std::call_once(at_exit_once, [] { atexit(RemoveFilesAtExit); });
+    listeners_[dir] = std::move(listener);
+    return true;
+}
+
+void ProcessState::RemoveFilesAtExit() {
+    ProcessState& state = Get();
+    // Another thread may hold the lock forever at exit; cleaning up is only a courtesy then.
+    std::unique_lock<std::mutex> lock(state.mutex_, std::try_to_lock);
+    if (!lock.owns_lock()) return;
+    for (const auto& entry : state.published_) {
+        Registry::Unpublish(entry.first, entry.second, state.key_);
+    }
+    for (const auto& entry : state.listeners_) {
+        unlink(Registry::SocketPath(entry.first, state.key_).c_str());
+        unlink(Registry::LockPath(entry.first, state.key_).c_str());
+    }
+}
+
+ndk::SpAIBinder ProcessState::Lookup(const std::string& name) {
+    ndk::SpAIBinder local = FindLocalService(name);
+    if (local.get() != nullptr) return local;
+    std::string dir;
+    std::string peer_key;
+    if (!Registry::Dir(&dir) || !Registry::Resolve(dir, name, &peer_key)) return nullptr;
+    if (peer_key == key()) return nullptr;
+    std::shared_ptr<Connection> connection = ConnectTo(dir, peer_key);
+    if (connection == nullptr) return nullptr;
+    ndk::SpAIBinder binder;
+    if (connection->Lookup(name, &binder) != STATUS_OK) return nullptr;
+    return binder;
+}
+
+std::shared_ptr<Connection> ProcessState::ConnectTo(const std::string& dir,
+                                                    const std::string& peer_key) {
+    JoinRetired();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (shutting_down_) return nullptr;
+        auto it = by_key_.find(peer_key);
+        if (it != by_key_.end()) {
+            std::shared_ptr<Connection> existing = it->second.lock();
+            if (existing != nullptr && !existing->dead()) return existing;
+        }
+    }
+    std::string path = Registry::SocketPath(dir, peer_key);
+    sockaddr_un addr{};
+    addr.sun_family = AF_UNIX;
+    if (path.size() >= sizeof(addr.sun_path)) return nullptr;
+    std::memcpy(addr.sun_path, path.c_str(), path.size() + 1);
+    int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    if (fd < 0) return nullptr;
+    if (connect(fd, reinterpret_cast<sockaddr*>(&addr), sizeof(addr)) != 0) {
+        close(fd);
+        return nullptr;
+    }
+    auto connection = std::make_shared<Connection>(fd);
+    if (connection->peer_uid() != geteuid()) return nullptr;
+    std::string own_key = key();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (shutting_down_) return nullptr;
+        auto it = by_key_.find(peer_key);
+        if (it != by_key_.end()) {
+            std::shared_ptr<Connection> existing = it->second.lock();
+            // Another thread connected meanwhile; ours was never started and just closes.
+            if (existing != nullptr && !existing->dead()) return existing;
+        }
+        by_key_[peer_key] = connection;
+        connections_.insert(connection);
+    }
+    connection->Start(own_key);
+    return connection;
+}
+
+void ProcessState::Adopt(const std::shared_ptr<Connection>& connection) {
+    std::string own_key = key();
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (shutting_down_) return;
+        connections_.insert(connection);
+    }
+    connection->Start(own_key);
+    JoinRetired();
+}
+
+void ProcessState::NamePeer(const std::shared_ptr<Connection>& connection,
+                            const std::string& peer_key) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    auto it = by_key_.find(peer_key);
+    if (it != by_key_.end()) {
+        std::shared_ptr<Connection> existing = it->second.lock();
+        if (existing != nullptr && !existing->dead()) return;
+    }
+    by_key_[peer_key] = connection;
+}
+
+void ProcessState::Retire(const std::shared_ptr<Connection>& connection, std::thread reader) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    connections_.erase(connection);
+    for (auto it = by_key_.begin(); it != by_key_.end();) {
+        std::shared_ptr<Connection> named = it->second.lock();
+        if (named == nullptr || named == connection) {
+            it = by_key_.erase(it);
+        } else {
+            ++it;
+        }
+    }
+    if (reader.joinable()) retired_.push_back(std::move(reader));
+    retired_cv_.notify_all();
+}
+
+void ProcessState::JoinRetired() {
+    std::vector<std::thread> joinable;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        for (auto it = retired_.begin(); it != retired_.end();) {
+            if (it->get_id() == std::this_thread::get_id()) {
+                ++it;
+                continue;
+            }
+            joinable.push_back(std::move(*it));
+            it = retired_.erase(it);
+        }
+    }
+    for (std::thread& thread : joinable) thread.join();
+}
+
 void ProcessState::Shutdown() {
+    std::map<std::string, std::unique_ptr<Listener>> listeners;
+    std::vector<std::pair<std::string, std::string>> published;
+    std::set<std::shared_ptr<Connection>> connections;
+    std::string own_key;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        shutting_down_ = true;
+        listeners.swap(listeners_);
+        published.swap(published_);
+        connections = connections_;
+        own_key = key_;
+    }
+    for (const auto& entry : published) Registry::Unpublish(entry.first, entry.second, own_key);
+    for (auto& entry : listeners) entry.second->Stop();
+    listeners.clear();
+    for (const std::shared_ptr<Connection>& connection : connections) connection->Close();
+    connections.clear();
+    {
+        std::unique_lock<std::mutex> lock(mutex_);
+        retired_cv_.wait(lock, [this] { return connections_.empty(); });
+    }
+    JoinRetired();
     pool_.Shutdown();
     std::map<std::string, ndk::SpAIBinder> services;
     {
         std::lock_guard<std::mutex> lock(services_mutex_);
         services.swap(services_);
     }
+    services.clear();
+    std::lock_guard<std::mutex> lock(mutex_);
+    key_.clear();
+    shutting_down_ = false;
 }
 
 }  // namespace vyr_binder

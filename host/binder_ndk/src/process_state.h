@@ -1,14 +1,24 @@
 #pragma once
 
 #include <android/binder_auto_utils.h>
+#include <android/binder_status.h>
 
+#include <condition_variable>
 #include <map>
+#include <memory>
 #include <mutex>
+#include <set>
 #include <string>
+#include <thread>
+#include <utility>
+#include <vector>
 
 #include "thread_pool.h"
 
 namespace vyr_binder {
+
+class Connection;
+class Listener;
 
 // Everything the runtime keeps per process. Made on first use and never destroyed, so runtime
 // threads still running at exit never see it torn down; VyrBinder_shutdown empties it instead.
@@ -17,19 +27,44 @@ class ProcessState {
     static ProcessState& Get();
 
     ThreadPool& pool() { return pool_; }
+    // Names this process to its peers: "p<pid>-<random>".
+    std::string key();
 
-    // Services this process published, by name.
-    void AddLocalService(const std::string& name, const ndk::SpAIBinder& binder);
+    binder_exception_t Publish(const std::string& name, const ndk::SpAIBinder& binder);
     ndk::SpAIBinder FindLocalService(const std::string& name);
+    // The named service: this process's own object, a proxy to another process's, or null.
+    ndk::SpAIBinder Lookup(const std::string& name);
+
+    // A connection a peer made to us.
+    void Adopt(const std::shared_ptr<Connection>& connection);
+    // Records the key a peer introduced itself with, so lookups reuse its connection.
+    void NamePeer(const std::shared_ptr<Connection>& connection, const std::string& key);
+    // Called by a connection's reader thread as its last act.
+    void Retire(const std::shared_ptr<Connection>& connection, std::thread reader);
 
     void Shutdown();
 
   private:
     ProcessState() = default;
+    std::shared_ptr<Connection> ConnectTo(const std::string& dir, const std::string& key);
+    bool EnsureListenerLocked(const std::string& dir);
+    void JoinRetired();
+    static void RemoveFilesAtExit();
 
     ThreadPool pool_;
+
     std::mutex services_mutex_;
     std::map<std::string, ndk::SpAIBinder> services_;
+
+    std::mutex mutex_;
+    std::condition_variable retired_cv_;
+    std::string key_;
+    bool shutting_down_ = false;
+    std::set<std::shared_ptr<Connection>> connections_;
+    std::map<std::string, std::weak_ptr<Connection>> by_key_;
+    std::vector<std::thread> retired_;
+    std::map<std::string, std::unique_ptr<Listener>> listeners_;  // by registry directory
+    std::vector<std::pair<std::string, std::string>> published_;  // (directory, name)
 };
 
 }  // namespace vyr_binder

@@ -1,0 +1,398 @@
+#include "connection.h"
+
+#include <android/binder_parcel_utils.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <utility>
+
+#include "call_context.h"
+#include "frame_io.h"
+#include "local_binder.h"
+#include "process_state.h"
+#include "proxy_binder.h"
+
+namespace vyr_binder {
+namespace {
+
+// Object id 0 is the process itself; it answers name lookups.
+constexpr uint64_t kContextObject = 0;
+constexpr transaction_code_t kLookupCode = 1;
+constexpr size_t kMaxKeyBytes = 128;
+
+}  // namespace
+
+Connection::Connection(int fd) : fd_(fd) {
+    ucred cred{};
+    socklen_t len = sizeof(cred);
+    if (getsockopt(fd_, SOL_SOCKET, SO_PEERCRED, &cred, &len) == 0) {
+        peer_pid_ = cred.pid;
+        peer_uid_ = cred.uid;
+    }
+}
+
+Connection::~Connection() {
+    close(fd_);
+}
+
+void Connection::Start(const std::string& own_key) {
+    AParcel hello;
+    hello.data.assign(own_key.begin(), own_key.end());
+    if (!Send(FrameType::kHello, 0, 0, 0, 0, 0, &hello, {})) Close();
+    std::shared_ptr<Connection> self = shared_from_this();
+    std::lock_guard<std::mutex> lock(thread_mutex_);
+    reader_ = std::thread([self] { self->ReadLoop(); });
+}
+
+void Connection::ReadLoop() {
+    FrameReader reader(fd_);
+    FrameView frame;
+    while (reader.Read(&frame) == FrameReader::Result::kFrame) {
+        if (!HandleFrame(frame)) break;
+    }
+    Die();
+    std::thread self;
+    {
+        std::lock_guard<std::mutex> lock(thread_mutex_);
+        self = std::move(reader_);
+    }
+    ProcessState::Get().Retire(shared_from_this(), std::move(self));
+}
+
+void Connection::Close() {
+    shutdown(fd_, SHUT_RDWR);
+}
+
+bool Connection::HandleFrame(const FrameView& frame) {
+    const FrameHeader& header = frame.header;
+    switch (static_cast<FrameType>(header.type)) {
+        case FrameType::kHello: {
+            if (header.data_size == 0 || header.data_size > kMaxKeyBytes) return false;
+            {
+                std::lock_guard<std::mutex> lock(mutex_);
+                if (hello_seen_) return false;
+                hello_seen_ = true;
+            }
+            std::string key(reinterpret_cast<const char*>(frame.data), header.data_size);
+            ProcessState::Get().NamePeer(shared_from_this(), key);
+            return true;
+        }
+        case FrameType::kRelease:
+            HandleRelease(header.target, header.code);
+            return true;
+        case FrameType::kTransaction:
+            return HandleTransaction(frame);
+        case FrameType::kReply:
+            return HandleReply(frame);
+    }
+    return false;
+}
+
+bool Connection::DecodeParcel(const FrameView& frame, AParcel* parcel) {
+    std::vector<WireObject> objects;
+    if (!DecodeObjects(frame.table, frame.header.table_size, frame.header.object_count, &objects)) {
+        return false;
+    }
+    parcel->data.assign(frame.data, frame.data + frame.header.data_size);
+    std::vector<ParcelObject> resolved;
+    resolved.reserve(objects.size());
+    bool ok = true;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        for (const WireObject& object : objects) {
+            if (object.kind == ObjectKind::kSenderObject) {
+                resolved.push_back(ParcelObject{0, ProxyForLocked(object.id, object.descriptor)});
+                continue;
+            }
+            // The peer can only name an object of ours it holds a reference to.
+            auto it = exports_.find(object.id);
+            if (it == exports_.end()) {
+                ok = false;
+                break;
+            }
+            resolved.push_back(ParcelObject{0, it->second.binder});
+        }
+    }
+    // Released outside the lock: dropping a proxy takes it.
+    parcel->objects = std::move(resolved);
+    return ok;
+}
+
+ndk::SpAIBinder Connection::ProxyForLocked(uint64_t id, const std::string& descriptor) {
+    auto it = proxies_.find(id);
+    if (it != proxies_.end()) {
+        AIBinder* alive = it->second->refs()->Promote();
+        if (alive != nullptr) {
+            ++it->second->acquired_;
+            return ndk::SpAIBinder(alive);
+        }
+    }
+    ProxyBinder* proxy = new ProxyBinder(shared_from_this(), id, descriptor);
+    proxy->acquired_ = 1;
+    proxies_[id] = proxy;
+    return ndk::SpAIBinder(proxy);
+}
+
+void Connection::ForgetProxy(ProxyBinder* proxy) {
+    uint32_t acquired;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        auto it = proxies_.find(proxy->remote_id());
+        if (it != proxies_.end() && it->second == proxy) proxies_.erase(it);
+        acquired = proxy->acquired_;
+        if (dead_.load(std::memory_order_relaxed)) return;
+    }
+    if (acquired == 0) return;
+    Send(FrameType::kRelease, acquired, 0, 0, proxy->remote_id(), 0, nullptr, {});
+}
+
+void Connection::HandleRelease(uint64_t id, uint32_t count) {
+    ndk::SpAIBinder dropped;
+    std::lock_guard<std::mutex> lock(mutex_);
+    auto it = exports_.find(id);
+    if (it == exports_.end()) return;
+    if (it->second.count <= count) {
+        dropped = std::move(it->second.binder);
+        exports_.erase(it);
+    } else {
+        it->second.count -= count;
+    }
+    // `dropped` is declared first, so it is released after the lock.
+}
+
+binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
+                                                std::vector<WireObject>* objects) {
+    for (const ParcelObject& object : parcel.objects) {
+        AIBinder* binder = object.binder.get();
+        if (binder->IsRemote() && static_cast<ProxyBinder*>(binder)->connection().get() != this) {
+            // Handing a third process's object on is not supported.
+            return STATUS_INVALID_OPERATION;
+        }
+    }
+    objects->reserve(parcel.objects.size());
+    for (const ParcelObject& object : parcel.objects) {
+        AIBinder* binder = object.binder.get();
+        if (binder->IsRemote()) {
+            objects->push_back(WireObject{
+                ObjectKind::kReceiverObject, static_cast<ProxyBinder*>(binder)->remote_id(), {}});
+            continue;
+        }
+        LocalBinder* local = static_cast<LocalBinder*>(binder);
+        uint64_t id = local->ExportId();
+        Export& entry = exports_[id];
+        if (entry.binder.get() == nullptr) entry.binder = object.binder;
+        ++entry.count;
+        objects->push_back(WireObject{ObjectKind::kSenderObject, id, local->Descriptor()});
+    }
+    return STATUS_OK;
+}
+
+bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
+                      uint64_t parent, const AParcel* parcel,
+                      const std::vector<WireObject>& objects) {
+    std::vector<uint8_t> table;
+    EncodeObjects(objects, &table);
+    FrameHeader header{};
+    header.magic = kFrameMagic;
+    header.type = static_cast<uint32_t>(type);
+    header.flags = flags;
+    header.code = code;
+    header.data_size = parcel == nullptr ? 0 : static_cast<uint32_t>(parcel->data.size());
+    header.object_count = static_cast<uint32_t>(objects.size());
+    header.table_size = static_cast<uint32_t>(table.size());
+    header.transaction_id = id;
+    header.target = target;
+    header.parent = parent;
+    std::lock_guard<std::mutex> lock(send_mutex_);
+    return SendFrame(fd_, header, parcel == nullptr ? nullptr : parcel->data.data(), table);
+}
+
+binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, const AParcel& in,
+                                     AParcel* out, binder_flags_t flags) {
+    if (in.data.size() > kMaxTransactionBytes || in.objects.size() > kMaxObjects) {
+        return STATUS_FAILED_TRANSACTION;
+    }
+    const bool oneway = (flags & FLAG_ONEWAY) != 0;
+    Waiter waiter;
+    std::vector<WireObject> objects;
+    uint64_t id;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (dead_.load(std::memory_order_relaxed)) return STATUS_DEAD_OBJECT;
+        binder_status_t status = EncodeObjectsLocked(in, &objects);
+        if (status != STATUS_OK) return status;
+        id = next_transaction_id_++;
+        if (!oneway) waiters_[id] = &waiter;
+    }
+    uint64_t parent = ScopedCallContext::ParentFor(this);
+    if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects)) {
+        Close();
+        std::lock_guard<std::mutex> lock(mutex_);
+        waiters_.erase(id);
+        return STATUS_DEAD_OBJECT;
+    }
+    if (oneway) return STATUS_OK;
+
+    std::unique_lock<std::mutex> lock(mutex_);
+    while (!waiter.done) {
+        if (waiter.nested.empty()) {
+            waiter.cv.wait(lock);
+            continue;
+        }
+        // The peer calls back into us while serving our call: serve it on this thread.
+        std::shared_ptr<Incoming> call = std::move(waiter.nested.front());
+        waiter.nested.pop_front();
+        lock.unlock();
+        Serve(*call);
+        call.reset();
+        lock.lock();
+    }
+    waiters_.erase(id);
+    std::deque<std::shared_ptr<Incoming>> dropped = std::move(waiter.nested);
+    std::unique_ptr<AParcel> reply = std::move(waiter.reply);
+    binder_status_t status = waiter.status;
+    lock.unlock();
+    dropped.clear();
+    if (status == STATUS_OK && reply != nullptr) {
+        out->data = std::move(reply->data);
+        out->objects = std::move(reply->objects);
+        out->pos = 0;
+    }
+    return status;
+}
+
+bool Connection::HandleReply(const FrameView& frame) {
+    std::unique_ptr<AParcel> reply(new AParcel);
+    if (!DecodeParcel(frame, reply.get())) return false;
+    std::lock_guard<std::mutex> lock(mutex_);
+    auto it = waiters_.find(frame.header.transaction_id);
+    if (it == waiters_.end()) return false;
+    Waiter* waiter = it->second;
+    waiter->status = static_cast<binder_status_t>(frame.header.code);
+    waiter->reply = std::move(reply);
+    waiter->done = true;
+    waiter->cv.notify_one();
+    return true;
+}
+
+bool Connection::HandleTransaction(const FrameView& frame) {
+    const FrameHeader& header = frame.header;
+    auto call = std::make_shared<Incoming>();
+    call->id = header.transaction_id;
+    call->code = header.code;
+    call->flags = header.flags;
+    call->data.reset(new AParcel);
+    if (!DecodeParcel(frame, call->data.get())) return false;
+    const bool oneway = (header.flags & FLAG_ONEWAY) != 0;
+    if (header.target == kContextObject) {
+        if (!oneway) ServeContextCall(*call);
+        return true;
+    }
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        auto it = exports_.find(header.target);
+        if (it != exports_.end()) call->target = it->second.binder;
+        if (header.parent != 0 && !oneway && call->target.get() != nullptr) {
+            auto waiter = waiters_.find(header.parent);
+            if (waiter != waiters_.end()) {
+                waiter->second->nested.push_back(std::move(call));
+                waiter->second->cv.notify_one();
+                return true;
+            }
+        }
+    }
+    if (call->target.get() == nullptr) {
+        if (!oneway) SendReply(call->id, STATUS_DEAD_OBJECT, AParcel());
+        return true;
+    }
+    std::shared_ptr<Connection> self = shared_from_this();
+    if (oneway) {
+        ProcessState::Get().pool().Enqueue([self, call] {
+            static_cast<LocalBinder*>(call->target.get())->RunOneway([self, call] {
+                self->Serve(*call);
+            });
+        });
+    } else {
+        ProcessState::Get().pool().Enqueue([self, call] { self->Serve(*call); });
+    }
+    return true;
+}
+
+void Connection::Serve(Incoming& call) {
+    ScopedCallContext context(peer_uid_, peer_pid_, this, call.id);
+    AParcel reply;
+    call.data->pos = 0;
+    binder_status_t status =
+        call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
+    if ((call.flags & FLAG_ONEWAY) == 0) SendReply(call.id, status, reply);
+}
+
+void Connection::ServeContextCall(Incoming& call) {
+    AParcel reply;
+    binder_status_t status = STATUS_UNKNOWN_TRANSACTION;
+    if (call.code == kLookupCode) {
+        std::string name;
+        status = ndk::AParcel_readString(call.data.get(), &name);
+        if (status == STATUS_OK) {
+            ndk::SpAIBinder service = ProcessState::Get().FindLocalService(name);
+            status = AParcel_writeStrongBinder(&reply, service.get());
+        }
+    }
+    SendReply(call.id, status, reply);
+}
+
+void Connection::SendReply(uint64_t id, binder_status_t status, const AParcel& reply) {
+    std::vector<WireObject> objects;
+    if (status == STATUS_OK &&
+        (reply.data.size() > kMaxTransactionBytes || reply.objects.size() > kMaxObjects)) {
+        status = STATUS_FAILED_TRANSACTION;
+    }
+    if (status == STATUS_OK) {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (dead_.load(std::memory_order_relaxed)) return;
+        status = EncodeObjectsLocked(reply, &objects);
+    }
+    const AParcel* body = status == STATUS_OK ? &reply : nullptr;
+    if (status != STATUS_OK) objects.clear();
+    if (!Send(FrameType::kReply, static_cast<uint32_t>(status), 0, id, 0, 0, body, objects)) {
+        Close();
+    }
+}
+
+binder_status_t Connection::Lookup(const std::string& name, ndk::SpAIBinder* binder) {
+    AParcel request;
+    binder_status_t status = ndk::AParcel_writeString(&request, name);
+    if (status != STATUS_OK) return status;
+    AParcel reply;
+    status = Transact(kContextObject, kLookupCode, request, &reply, 0);
+    if (status != STATUS_OK) return status;
+    return ndk::AParcel_readNullableStrongBinder(&reply, binder);
+}
+
+void Connection::Die() {
+    std::vector<ndk::SpAIBinder> proxies;
+    std::unordered_map<uint64_t, Export> exports;
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        if (dead_.load(std::memory_order_relaxed)) return;
+        dead_.store(true, std::memory_order_release);
+        // Calls waiting on the peer fail now, before anyone hears of the death.
+        for (auto& entry : waiters_) {
+            entry.second->done = true;
+            entry.second->status = STATUS_DEAD_OBJECT;
+            entry.second->cv.notify_one();
+        }
+        for (auto& entry : proxies_) {
+            AIBinder* alive = entry.second->refs()->Promote();
+            if (alive != nullptr) proxies.emplace_back(alive);
+        }
+        exports.swap(exports_);
+    }
+    shutdown(fd_, SHUT_RDWR);
+    exports.clear();
+    for (const ndk::SpAIBinder& proxy : proxies) {
+        static_cast<ProxyBinder*>(proxy.get())->SendObituaries();
+    }
+}
+
+}  // namespace vyr_binder

@@ -1,0 +1,110 @@
+#pragma once
+
+#include <android/binder_auto_utils.h>
+#include <android/binder_ibinder.h>
+#include <sys/types.h>
+
+#include <atomic>
+#include <condition_variable>
+#include <cstdint>
+#include <deque>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <unordered_map>
+#include <vector>
+
+#include "parcel.h"
+#include "wire.h"
+
+namespace vyr_binder {
+
+class ProxyBinder;
+struct FrameView;
+
+// One socket to one peer process, used both ways. A reader thread takes every frame off the
+// socket: replies go to the thread waiting for them, calls nested in one of ours go to the
+// thread that made it, other calls go to the thread pool.
+class Connection : public std::enable_shared_from_this<Connection> {
+  public:
+    // Takes a connected socket; the peer's credentials come from the socket.
+    explicit Connection(int fd);
+    ~Connection();
+    Connection(const Connection&) = delete;
+    Connection& operator=(const Connection&) = delete;
+
+    // Introduces this process and starts reading.
+    void Start(const std::string& own_key);
+
+    binder_status_t Transact(uint64_t target, transaction_code_t code, const AParcel& in,
+                             AParcel* out, binder_flags_t flags);
+    // The binder the peer published under `name`, or null.
+    binder_status_t Lookup(const std::string& name, ndk::SpAIBinder* binder);
+
+    bool dead() const { return dead_.load(std::memory_order_acquire); }
+    pid_t peer_pid() const { return peer_pid_; }
+    uid_t peer_uid() const { return peer_uid_; }
+    // Ends the connection: the peer's objects die here and ours lose this peer's references.
+    void Close();
+
+    void ForgetProxy(ProxyBinder* proxy);
+
+  private:
+    struct Incoming {
+        uint64_t id;
+        uint32_t code;
+        uint32_t flags;
+        std::unique_ptr<AParcel> data;
+        ndk::SpAIBinder target;
+    };
+    // A thread waiting for the reply to one of its transactions.
+    struct Waiter {
+        std::condition_variable cv;
+        bool done = false;
+        binder_status_t status = STATUS_OK;
+        std::unique_ptr<AParcel> reply;
+        std::deque<std::shared_ptr<Incoming>> nested;
+    };
+    struct Export {
+        ndk::SpAIBinder binder;
+        uint64_t count = 0;
+    };
+
+    void ReadLoop();
+    // False when the peer broke the protocol.
+    bool HandleFrame(const FrameView& frame);
+    bool HandleTransaction(const FrameView& frame);
+    bool HandleReply(const FrameView& frame);
+    void HandleRelease(uint64_t id, uint32_t count);
+    void ServeContextCall(Incoming& call);
+    void Serve(Incoming& call);
+    void Die();
+
+    // Resolves the object table of a received parcel into binders.
+    bool DecodeParcel(const FrameView& frame, AParcel* parcel);
+    binder_status_t EncodeObjectsLocked(const AParcel& parcel, std::vector<WireObject>* objects);
+    ndk::SpAIBinder ProxyForLocked(uint64_t id, const std::string& descriptor);
+    bool Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
+              uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects);
+    void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
+
+    const int fd_;
+    pid_t peer_pid_ = -1;
+    uid_t peer_uid_ = static_cast<uid_t>(-1);
+    std::atomic<bool> dead_{false};
+
+    std::mutex send_mutex_;
+
+    std::mutex mutex_;
+    uint64_t next_transaction_id_ = 1;
+    std::unordered_map<uint64_t, Waiter*> waiters_;
+    std::unordered_map<uint64_t, Export> exports_;
+    std::unordered_map<uint64_t, ProxyBinder*> proxies_;
+    bool hello_seen_ = false;
+
+    std::mutex thread_mutex_;
+    std::thread reader_;
+};
+
+}  // namespace vyr_binder

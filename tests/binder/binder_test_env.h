@@ -1,0 +1,21 @@
+#pragma once
+
+#include <string>
+
+namespace vyr_binder_test {
+
+// A fresh registry directory for one test, set as VYR_BINDER_DIR; removed by the destructor.
+class ScopedRegistryDir {
+  public:
+    ScopedRegistryDir();
+    ~ScopedRegistryDir();
+    ScopedRegistryDir(const ScopedRegistryDir&) = delete;
+    ScopedRegistryDir& operator=(const ScopedRegistryDir&) = delete;
+
+    const std::string& path() const { return path_; }
+
+  private:
+    std::string path_;
+};
+
+}  // namespace vyr_binder_test

@@ -1,0 +1,455 @@
+#include <aidl/android/vyr/IVYRService.h>
+#include <android/binder_manager.h>
+#include <android/binder_process.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <vyr/binder_host.h>
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "binder_test_env.h"
+#include "echo_binder.h"
+#include "test_service.h"
+
+extern char** environ;
+
+namespace {
+
+using aidl::android::vyr::Event;
+using aidl::android::vyr::IEventCallback;
+using aidl::android::vyr::IVYRService;
+using vyr_binder_test::RecordingCallback;
+using vyr_binder_test::TestService;
+using namespace std::chrono_literals;
+
+// Death notices as the runtime delivered them: cookie and thread.
+class DeathLog {
+  public:
+    static DeathLog& Get() {
+        static DeathLog* log = new DeathLog;
+        return *log;
+    }
+    static void OnDied(void* cookie) {
+        DeathLog& log = Get();
+        std::lock_guard<std::mutex> lock(log.mutex_);
+        log.notices_.emplace_back(cookie, std::this_thread::get_id());
+        log.cv_.notify_all();
+    }
+    void Clear() {
+        std::lock_guard<std::mutex> lock(mutex_);
+        notices_.clear();
+    }
+    bool WaitFor(size_t count, std::chrono::milliseconds timeout = 10s) {
+        std::unique_lock<std::mutex> lock(mutex_);
+        return cv_.wait_for(lock, timeout, [&] { return notices_.size() >= count; });
+    }
+    std::vector<std::pair<void*, std::thread::id>> notices() {
+        std::lock_guard<std::mutex> lock(mutex_);
+        return notices_;
+    }
+    size_t CountOf(void* cookie) {
+        size_t n = 0;
+        for (const auto& notice : notices()) n += notice.first == cookie ? 1 : 0;
+        return n;
+    }
+
+  private:
+    std::mutex mutex_;
+    std::condition_variable cv_;
+    std::vector<std::pair<void*, std::thread::id>> notices_;
+};
+
+template <typename Predicate>
+bool Eventually(Predicate predicate, std::chrono::milliseconds timeout = 10s) {
+    auto deadline = std::chrono::steady_clock::now() + timeout;
+    while (!predicate()) {
+        if (std::chrono::steady_clock::now() > deadline) return false;
+        std::this_thread::sleep_for(5ms);
+    }
+    return true;
+}
+
+class CrossProcessTest : public ::testing::Test {
+  protected:
+    void SetUp() override {
+        ASSERT_FALSE(registry_.path().empty());
+        DeathLog::Get().Clear();
+        ABinderProcess_startThreadPool();
+    }
+
+    void TearDown() override {
+        for (pid_t pid : children_) Kill(pid);
+        VyrBinder_shutdown();
+    }
+
+    pid_t Spawn(const std::string& mode, const std::string& name) {
+        std::string helper = BINDER_TEST_HELPER;
+        std::vector<char*> argv = {helper.data(), const_cast<char*>(mode.c_str()),
+                                   const_cast<char*>(name.c_str()), nullptr};
+        pid_t pid = -1;
+        if (posix_spawn(&pid, helper.c_str(), nullptr, nullptr, argv.data(), environ) != 0) {
+            return -1;
+        }
+        children_.push_back(pid);
+        return pid;
+    }
+
+    void Kill(pid_t pid) {
+        for (auto it = children_.begin(); it != children_.end(); ++it) {
+            if (*it == pid) {
+                kill(pid, SIGKILL);
+                waitpid(pid, nullptr, 0);
+                children_.erase(it);
+                return;
+            }
+        }
+    }
+
+    ndk::SpAIBinder WaitForService(const std::string& name) {
+        ndk::SpAIBinder binder;
+        Eventually([&] {
+            binder.set(AServiceManager_checkService(name.c_str()));
+            return binder.get() != nullptr;
+        });
+        return binder;
+    }
+
+    // Starts a helper serving a TestService as `name`.
+    std::shared_ptr<IVYRService> StartServer(const std::string& name, pid_t* pid = nullptr) {
+        pid_t child = Spawn("serve", name);
+        if (pid != nullptr) *pid = child;
+        return IVYRService::fromBinder(WaitForService(name));
+    }
+
+    vyr_binder_test::ScopedRegistryDir registry_;
+    std::vector<pid_t> children_;
+};
+
+TEST_F(CrossProcessTest, CallsReachTheOtherProcess) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    EXPECT_TRUE(service->isRemote());
+    EXPECT_TRUE(AIBinder_isRemote(service->asBinder().get()));
+    EXPECT_TRUE(AIBinder_isAlive(service->asBinder().get()));
+    EXPECT_EQ(STATUS_OK, AIBinder_ping(service->asBinder().get()));
+    int32_t result = 0;
+    ASSERT_TRUE(service->Open(3, &result).isOk());
+    EXPECT_EQ(30, result);
+    ASSERT_TRUE(service->Enable(7, 100, &result).isOk());
+    EXPECT_EQ(107, result);
+    ASSERT_TRUE(service->EnableLowPower(1, false, &result).isOk());
+    EXPECT_EQ(0, result);
+    ASSERT_TRUE(service->ConfigureParameters(1, {5, 6, 7}, &result).isOk());
+    EXPECT_EQ(18, result);
+    Event event;
+    ASSERT_TRUE(service->PollOnce(4, &event, &result).isOk());
+    EXPECT_EQ(getpid(), result);
+    EXPECT_EQ(4, event.status);
+    EXPECT_EQ(1000000000004LL, event.timestamp);
+    EXPECT_EQ(6.0f, event.value0);
+    EXPECT_EQ(std::vector<float>(4, 0.5f), event.data);
+    ndk::ScopedAStatus error = service->Disable(-3);
+    EXPECT_EQ(EX_SERVICE_SPECIFIC, error.getExceptionCode());
+    EXPECT_EQ(-3, error.getServiceSpecificError());
+    EXPECT_STREQ("neg", error.getMessage());
+}
+
+TEST_F(CrossProcessTest, CallingIdentityComesFromThePeer) {
+    StartServer("vyr.test");
+    ndk::SpAIBinder echo = WaitForService("vyr.test.echo");
+    ASSERT_TRUE(AIBinder_associateClass(echo.get(), vyr_binder_test::EchoClass()));
+    AParcel* in = nullptr;
+    AParcel* out = nullptr;
+    ASSERT_EQ(STATUS_OK, AIBinder_prepareTransaction(echo.get(), &in));
+    ASSERT_EQ(STATUS_OK, AIBinder_transact(echo.get(), vyr_binder_test::kIdentity, &in, &out, 0));
+    ndk::ScopedAParcel reply(out);
+    int32_t uid = -1;
+    int32_t pid = -1;
+    ASSERT_EQ(STATUS_OK, AParcel_readInt32(reply.get(), &uid));
+    ASSERT_EQ(STATUS_OK, AParcel_readInt32(reply.get(), &pid));
+    EXPECT_EQ(static_cast<int32_t>(getuid()), uid);
+    EXPECT_EQ(getpid(), pid);
+    // Outside a transaction the caller is this process itself.
+    EXPECT_EQ(getpid(), AIBinder_getCallingPid());
+    EXPECT_EQ(getuid(), AIBinder_getCallingUid());
+}
+
+TEST_F(CrossProcessTest, OneAIBinderPerObjectAndOwnObjectsComeBackLocal) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ndk::SpAIBinder first(AServiceManager_getService("vyr.test"));
+    ndk::SpAIBinder second(AServiceManager_getService("vyr.test"));
+    EXPECT_EQ(first.get(), second.get());
+    EXPECT_EQ(service->asBinder().get(), first.get());
+
+    ndk::SpAIBinder echo = WaitForService("vyr.test.echo");
+    ASSERT_TRUE(AIBinder_associateClass(echo.get(), vyr_binder_test::EchoClass()));
+    // The IVYRService object does not answer to the echo interface.
+    EXPECT_FALSE(AIBinder_associateClass(first.get(), vyr_binder_test::EchoClass()));
+
+    auto roundtrip = [&](AIBinder* sent) {
+        AParcel* in = nullptr;
+        AParcel* out = nullptr;
+        EXPECT_EQ(STATUS_OK, AIBinder_prepareTransaction(echo.get(), &in));
+        EXPECT_EQ(STATUS_OK, AParcel_writeStrongBinder(in, sent));
+        EXPECT_EQ(STATUS_OK,
+                  AIBinder_transact(echo.get(), vyr_binder_test::kEchoBinder, &in, &out, 0));
+        ndk::ScopedAParcel reply(out);
+        ndk::SpAIBinder back;
+        EXPECT_EQ(STATUS_OK, AParcel_readStrongBinder(reply.get(), back.getR()));
+        return back;
+    };
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    ndk::SpAIBinder local = callback->asBinder();
+    EXPECT_EQ(local.get(), roundtrip(local.get()).get());
+    EXPECT_EQ(first.get(), roundtrip(first.get()).get());
+    EXPECT_EQ(nullptr, roundtrip(nullptr).get());
+}
+
+TEST_F(CrossProcessTest, NestedCallbacksDuringACallDoNotDeadlock) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    int32_t result = 0;
+    // The service calls OnEvent three times while this thread waits for SetCallback's reply.
+    ASSERT_TRUE(service->SetCallback(3, callback, &result).isOk());
+    EXPECT_EQ(3, result);
+    std::vector<Event> events = callback->events();
+    ASSERT_EQ(3u, events.size());
+    EXPECT_EQ(2, events[2].status);
+    EXPECT_EQ(std::vector<float>(2, 0.5f), events[2].data);
+}
+
+TEST_F(CrossProcessTest, CallbackIsCalledLaterFromAnotherThread) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    int32_t result = 0;
+    ASSERT_TRUE(service->SetCallback(0, callback, &result).isOk());
+    ASSERT_TRUE(service->Close(5).isOk());
+    ASSERT_TRUE(callback->WaitForEvents(5));
+    EXPECT_EQ(4, callback->events()[4].status);
+}
+
+TEST_F(CrossProcessTest, ExportedObjectLivesWhileThePeerHoldsIt) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    std::weak_ptr<RecordingCallback> weak;
+    {
+        auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+        weak = callback;
+        int32_t result = 0;
+        ASSERT_TRUE(service->SetCallback(0, callback, &result).isOk());
+    }
+    // Only the peer holds it now.
+    ASSERT_TRUE(service->Close(1).isOk());
+    ASSERT_TRUE(Eventually([&] {
+        auto callback = weak.lock();
+        return callback != nullptr && callback->events().size() == 1;
+    }));
+    int32_t result = 0;
+    ASSERT_TRUE(service->SetCallback(0, nullptr, &result).isOk());
+    EXPECT_EQ(-22, result);
+    EXPECT_TRUE(Eventually([&] { return weak.expired(); }));
+}
+
+TEST_F(CrossProcessTest, PeerDeathNotifiesEveryLinkOnceWithItsCookie) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, service);
+    AIBinder* binder = service->asBinder().get();
+    ndk::ScopedAIBinder_DeathRecipient first(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    ndk::ScopedAIBinder_DeathRecipient second(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    int cookies[3];
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, first.get(), &cookies[0]));
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, first.get(), &cookies[1]));
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, second.get(), &cookies[2]));
+    ndk::SpAIBinder echo = WaitForService("vyr.test.echo");
+
+    Kill(pid);
+    ASSERT_TRUE(DeathLog::Get().WaitFor(3));
+    // Nothing more arrives.
+    EXPECT_FALSE(DeathLog::Get().WaitFor(4, 200ms));
+    for (int& cookie : cookies) EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookie));
+    for (const auto& notice : DeathLog::Get().notices()) {
+        EXPECT_NE(std::this_thread::get_id(), notice.second);
+    }
+    EXPECT_FALSE(AIBinder_isAlive(binder));
+    EXPECT_FALSE(AIBinder_isAlive(echo.get()));
+    int32_t result = 0;
+    EXPECT_EQ(STATUS_DEAD_OBJECT, service->Open(1, &result).getStatus());
+    EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_ping(binder));
+    EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_linkToDeath(binder, first.get(), &cookies[0]));
+}
+
+TEST_F(CrossProcessTest, CallInFlightFailsAtOnceWhenThePeerDies) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, service);
+    std::atomic<binder_status_t> status{STATUS_OK};
+    std::atomic<bool> returned{false};
+    std::thread caller([&] {
+        int32_t result = 0;
+        status = service->EnableLowPower(TestService::kBlockForever, true, &result).getStatus();
+        returned = true;
+    });
+    // The call is being served once the blocking method holds a pool thread; a ping still
+    // goes through on another one.
+    EXPECT_EQ(STATUS_OK, AIBinder_ping(service->asBinder().get()));
+    std::this_thread::sleep_for(50ms);
+    EXPECT_FALSE(returned.load());
+    Kill(pid);
+    EXPECT_TRUE(Eventually([&] { return returned.load(); }, 5s));
+    caller.join();
+    EXPECT_EQ(STATUS_DEAD_OBJECT, status.load());
+}
+
+TEST_F(CrossProcessTest, UnlinkedRecipientsAreNotNotified) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, service);
+    AIBinder* binder = service->asBinder().get();
+    ndk::ScopedAIBinder_DeathRecipient exact(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    ndk::ScopedAIBinder_DeathRecipient by_null(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    AIBinder_DeathRecipient* deleted = AIBinder_DeathRecipient_new(DeathLog::OnDied);
+    ndk::ScopedAIBinder_DeathRecipient kept(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    int cookies[5];
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, exact.get(), &cookies[0]));
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, by_null.get(), &cookies[1]));
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, by_null.get(), &cookies[2]));
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, deleted, &cookies[3]));
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, kept.get(), &cookies[4]));
+
+    EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder, exact.get(), &cookies[1]));
+    EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, exact.get(), &cookies[0]));
+    EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder, exact.get(), &cookies[0]));
+    // A null cookie removes every link of the recipient on this binder.
+    EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, by_null.get(), nullptr));
+    AIBinder_DeathRecipient_delete(deleted);
+
+    Kill(pid);
+    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
+    EXPECT_FALSE(DeathLog::Get().WaitFor(2, 200ms));
+    EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookies[4]));
+    EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_unlinkToDeath(binder, kept.get(), &cookies[4]));
+}
+
+TEST_F(CrossProcessTest, ClientDeathIsSeenByTheService) {
+    auto service = ndk::SharedRefBase::make<TestService>();
+    ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "vyr.local"));
+    pid_t pid = Spawn("client", "vyr.local");
+    ASSERT_TRUE(Eventually([&] { return service->callback() != nullptr; }));
+    std::shared_ptr<IEventCallback> callback = service->callback();
+    EXPECT_TRUE(callback->isRemote());
+    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    int cookie = 0;
+    AIBinder* binder = callback->asBinder().get();
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, recipient.get(), &cookie));
+    ASSERT_TRUE(service->Close(2).isOk());
+    Kill(pid);
+    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
+    EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookie));
+    EXPECT_EQ(STATUS_DEAD_OBJECT, callback->OnEvent(Event()).getStatus());
+}
+
+TEST_F(CrossProcessTest, OnewayCallsArrive) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    AIBinder* binder = service->asBinder().get();
+    for (int32_t state = 1; state <= 20; ++state) {
+        AParcel* in = nullptr;
+        AParcel* out = nullptr;
+        ASSERT_EQ(STATUS_OK, AIBinder_prepareTransaction(binder, &in));
+        ASSERT_EQ(STATUS_OK, AParcel_writeInt32(in, state));
+        ASSERT_EQ(STATUS_OK,
+                  AIBinder_transact(binder, FIRST_CALL_TRANSACTION + 8, &in, &out, FLAG_ONEWAY));
+        ndk::ScopedAParcel reply(out);
+    }
+    // Oneway calls to one object run in order, so the last one sent is the last one applied.
+    EXPECT_TRUE(Eventually([&] {
+        int32_t state = 0;
+        return service->Open(TestService::kQueryTorch, &state).isOk() && state == 20;
+    }));
+}
+
+TEST_F(CrossProcessTest, TransactionsOverOneMebibyteAreRefused) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    int32_t result = 0;
+    std::vector<int32_t> big(300 * 1024, 1);
+    ndk::ScopedAStatus status = service->ConfigureParameters(1, big, &result);
+    EXPECT_EQ(STATUS_FAILED_TRANSACTION, status.getStatus());
+    std::vector<int32_t> fits(200 * 1024, 1);
+    ASSERT_TRUE(service->ConfigureParameters(1, fits, &result).isOk());
+    EXPECT_EQ(200 * 1024, result);
+}
+
+TEST_F(CrossProcessTest, SixteenThreadsCallAtOnce) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    std::atomic<int> failures{0};
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 16; ++t) {
+        threads.emplace_back([&, t] {
+            for (int i = 0; i < 200; ++i) {
+                int32_t result = 0;
+                if (!service->Enable(t * 1000, i, &result).isOk() || result != t * 1000 + i) {
+                    ++failures;
+                }
+            }
+        });
+    }
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(0, failures.load());
+}
+
+TEST_F(CrossProcessTest, MissingServicesAreNull) {
+    EXPECT_EQ(nullptr, AServiceManager_checkService("vyr.missing"));
+    auto start = std::chrono::steady_clock::now();
+    EXPECT_EQ(nullptr, AServiceManager_getService("vyr.missing"));
+    EXPECT_LT(std::chrono::steady_clock::now() - start, 5s);
+    EXPECT_EQ(nullptr, AServiceManager_checkService("bad name"));
+}
+
+TEST_F(CrossProcessTest, WaitForServiceWaitsForTheName) {
+    std::thread starter([&] {
+        std::this_thread::sleep_for(100ms);
+        Spawn("serve", "vyr.late");
+    });
+    ndk::SpAIBinder binder(AServiceManager_waitForService("vyr.late"));
+    starter.join();
+    ASSERT_NE(nullptr, binder.get());
+    EXPECT_TRUE(AIBinder_isRemote(binder.get()));
+}
+
+TEST_F(CrossProcessTest, NamesOfDeadProcessesAreReplacedAndLiveOnesKept) {
+    pid_t pid = -1;
+    ASSERT_NE(nullptr, StartServer("vyr.test", &pid));
+    auto mine = ndk::SharedRefBase::make<TestService>();
+    EXPECT_EQ(EX_ILLEGAL_STATE, AServiceManager_addService(mine->asBinder().get(), "vyr.test"));
+    Kill(pid);
+    EXPECT_EQ(EX_NONE, AServiceManager_addService(mine->asBinder().get(), "vyr.test"));
+    ndk::SpAIBinder found(AServiceManager_checkService("vyr.test"));
+    EXPECT_EQ(mine.get(), IVYRService::fromBinder(found).get());
+}
+
+TEST_F(CrossProcessTest, WrongInterfaceTokenIsRefusedRemotely) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    AIBinder* binder = service->asBinder().get();
+    AParcel* in = nullptr;
+    AParcel* out = nullptr;
+    ASSERT_EQ(STATUS_OK, AIBinder_prepareTransaction(binder, &in));
+    ASSERT_EQ(STATUS_OK, AParcel_setDataPosition(in, 0));
+    ASSERT_EQ(STATUS_OK, AParcel_writeInt32(in, 12345));
+    EXPECT_EQ(STATUS_BAD_TYPE, AIBinder_transact(binder, FIRST_CALL_TRANSACTION, &in, &out, 0));
+    int32_t result = 0;
+    EXPECT_TRUE(service->Open(1, &result).isOk());
+}
+
+}  // namespace
