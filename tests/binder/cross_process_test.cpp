@@ -4,12 +4,16 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <spawn.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <vyr/binder_host.h>
 
 #include <atomic>
 #include <chrono>
+#include <cstring>
 #include <condition_variable>
 #include <mutex>
 #include <string>
@@ -19,6 +23,8 @@
 #include "binder_test_env.h"
 #include "echo_binder.h"
 #include "test_service.h"
+#include "frame_io.h"
+#include "wire.h"
 
 extern char** environ;
 
@@ -450,6 +456,150 @@ TEST_F(CrossProcessTest, WrongInterfaceTokenIsRefusedRemotely) {
     EXPECT_EQ(STATUS_BAD_TYPE, AIBinder_transact(binder, FIRST_CALL_TRANSACTION, &in, &out, 0));
     int32_t result = 0;
     EXPECT_TRUE(service->Open(1, &result).isOk());
+}
+
+// Frames written by hand straight to a helper's socket: the helper must drop that connection
+// and keep serving everyone else.
+class MalformedFrameTest : public CrossProcessTest {
+  protected:
+    void SetUp() override {
+        CrossProcessTest::SetUp();
+        service_ = StartServer("vyr.test", &pid_);
+        ASSERT_NE(nullptr, service_);
+    }
+
+    int ConnectRaw() {
+        char key[256] = {};
+        std::string entry = registry_.path() + "/svc.vyr.test";
+        if (readlink(entry.c_str(), key, sizeof(key) - 1) <= 0) return -1;
+        std::string path = registry_.path() + "/" + key + ".sock";
+        sockaddr_un addr{};
+        addr.sun_family = AF_UNIX;
+        std::memcpy(addr.sun_path, path.c_str(), path.size() + 1);
+        int fd = socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0);
+        if (connect(fd, reinterpret_cast<sockaddr*>(&addr), sizeof(addr)) != 0) {
+            close(fd);
+            return -1;
+        }
+        return fd;
+    }
+
+    static void SendBytes(int fd, const void* bytes, size_t size) {
+        ASSERT_EQ(static_cast<ssize_t>(size), send(fd, bytes, size, MSG_NOSIGNAL));
+    }
+
+    static vyr_binder::FrameHeader Header(vyr_binder::FrameType type) {
+        vyr_binder::FrameHeader header{};
+        header.magic = vyr_binder::kFrameMagic;
+        header.type = static_cast<uint32_t>(type);
+        header.transaction_id = 1;
+        return header;
+    }
+
+    // True when the helper closed the connection (after its HELLO, which is skipped).
+    static bool ClosedByPeer(int fd) {
+        char buffer[4096];
+        auto deadline = std::chrono::steady_clock::now() + 10s;
+        while (std::chrono::steady_clock::now() < deadline) {
+            pollfd p{fd, POLLIN, 0};
+            if (poll(&p, 1, 100) <= 0) continue;
+            ssize_t n = recv(fd, buffer, sizeof(buffer), 0);
+            if (n <= 0) return true;
+        }
+        return false;
+    }
+
+    void ExpectStillServing() {
+        int status = 0;
+        EXPECT_EQ(0, waitpid(pid_, &status, WNOHANG));
+        int32_t result = 0;
+        EXPECT_TRUE(service_->Open(2, &result).isOk());
+        EXPECT_EQ(20, result);
+    }
+
+    std::shared_ptr<IVYRService> service_;
+    pid_t pid_ = -1;
+};
+
+TEST_F(MalformedFrameTest, GarbageClosesOnlyThatConnection) {
+    int fd = ConnectRaw();
+    ASSERT_GE(fd, 0);
+    std::vector<uint8_t> garbage(300, 0xab);
+    SendBytes(fd, garbage.data(), garbage.size());
+    EXPECT_TRUE(ClosedByPeer(fd));
+    close(fd);
+    ExpectStillServing();
+}
+
+TEST_F(MalformedFrameTest, TruncatedFrameClosesOnlyThatConnection) {
+    int fd = ConnectRaw();
+    ASSERT_GE(fd, 0);
+    vyr_binder::FrameHeader header = Header(vyr_binder::FrameType::kTransaction);
+    header.target = 1;
+    header.data_size = 100;
+    SendBytes(fd, &header, sizeof(header));
+    SendBytes(fd, "0123456789", 10);
+    shutdown(fd, SHUT_WR);
+    EXPECT_TRUE(ClosedByPeer(fd));
+    close(fd);
+    ExpectStillServing();
+}
+
+TEST_F(MalformedFrameTest, OversizedFrameIsRefusedBeforeReadingIt) {
+    int fd = ConnectRaw();
+    ASSERT_GE(fd, 0);
+    vyr_binder::FrameHeader header = Header(vyr_binder::FrameType::kTransaction);
+    header.data_size = 64u << 20;
+    SendBytes(fd, &header, sizeof(header));
+    EXPECT_TRUE(ClosedByPeer(fd));
+    close(fd);
+    ExpectStillServing();
+}
+
+TEST_F(MalformedFrameTest, ReferenceToAnObjectNeverHandedOutClosesTheConnection) {
+    int fd = ConnectRaw();
+    ASSERT_GE(fd, 0);
+    std::vector<uint8_t> table;
+    vyr_binder::EncodeObjects({{vyr_binder::ObjectKind::kReceiverObject, 12345, {}}}, &table);
+    vyr_binder::FrameHeader header = Header(vyr_binder::FrameType::kTransaction);
+    header.target = 1;
+    header.object_count = 1;
+    header.table_size = static_cast<uint32_t>(table.size());
+    SendBytes(fd, &header, sizeof(header));
+    SendBytes(fd, table.data(), table.size());
+    EXPECT_TRUE(ClosedByPeer(fd));
+    close(fd);
+    ExpectStillServing();
+}
+
+TEST_F(MalformedFrameTest, ReplyToNothingClosesTheConnection) {
+    int fd = ConnectRaw();
+    ASSERT_GE(fd, 0);
+    vyr_binder::FrameHeader header = Header(vyr_binder::FrameType::kReply);
+    header.transaction_id = 999;
+    SendBytes(fd, &header, sizeof(header));
+    EXPECT_TRUE(ClosedByPeer(fd));
+    close(fd);
+    ExpectStillServing();
+}
+
+TEST_F(MalformedFrameTest, CallToUnknownObjectIsAnsweredDeadObject) {
+    int fd = ConnectRaw();
+    ASSERT_GE(fd, 0);
+    vyr_binder::FrameHeader header = Header(vyr_binder::FrameType::kTransaction);
+    header.target = 4242;
+    header.code = FIRST_CALL_TRANSACTION;
+    SendBytes(fd, &header, sizeof(header));
+    // The helper's HELLO, then the reply.
+    vyr_binder::FrameReader reader(fd);
+    vyr_binder::FrameView frame;
+    ASSERT_EQ(vyr_binder::FrameReader::Result::kFrame, reader.Read(&frame));
+    EXPECT_EQ(static_cast<uint32_t>(vyr_binder::FrameType::kHello), frame.header.type);
+    ASSERT_EQ(vyr_binder::FrameReader::Result::kFrame, reader.Read(&frame));
+    EXPECT_EQ(static_cast<uint32_t>(vyr_binder::FrameType::kReply), frame.header.type);
+    EXPECT_EQ(static_cast<uint32_t>(STATUS_DEAD_OBJECT), frame.header.code);
+    close(fd);
+    ExpectStillServing();
 }
 
 }  // namespace
