@@ -125,12 +125,13 @@ TEST_F(CrossProcessTest, CallbackClientReceivesEventsAtItsPeriod) {
     EXPECT_TRUE(ExitedWith(stream->Wait(kWait), 0));
     ASSERT_EQ(lines.size(), 5u);
 
-    int64_t previous = -1;
+    // A sample is known by its time stamp and frame number. The first one may be the sample
+    // that an earlier client left stored, so they need not increase.
+    std::set<std::pair<int64_t, int64_t>> samples;
     for (const std::string& line : lines) {
         EXPECT_NE(line.find("\"sensor\":\"range\""), std::string::npos) << line;
-        int64_t timestamp = JsonInt(line, "timestamp");
-        EXPECT_GT(timestamp, previous) << "a sample was delivered twice: " << line;
-        previous = timestamp;
+        EXPECT_TRUE(samples.emplace(JsonInt(line, "timestamp"), JsonInt(line, "frame_number")).second)
+            << "a sample was delivered twice: " << line;
         int64_t zones = JsonInt(line, "zone_count");
         EXPECT_EQ(JsonArrayLength(line, "data"), static_cast<size_t>(10 + 11 * zones)) << line;
     }
@@ -164,16 +165,18 @@ TEST_F(CrossProcessTest, TwoClientsEachTakeEverySampleOnce) {
     ASSERT_TRUE(service_->Enable(first, 50, &result).isOk());
     ASSERT_EQ(result, 0);
 
-    std::map<int32_t, std::vector<int64_t>> taken;
+    // A sample is known by its time stamp and frame number (the last header value).
+    std::map<int32_t, std::vector<std::pair<int64_t, int64_t>>> taken;
     auto end = steady_clock::now() + milliseconds(1500);
     while (steady_clock::now() < end) {
         for (int32_t handle : {first, second}) {
             Event event{};
             ASSERT_TRUE(service_->PollOnce(handle, &event, &result).isOk());
-            if (result == 0)
-                taken[handle].push_back(event.timestamp);
-            else
+            if (result == 0) {
+                taken[handle].emplace_back(event.timestamp, static_cast<int64_t>(event.data.at(9)));
+            } else {
                 EXPECT_EQ(result, -61);
+            }
         }
         std::this_thread::sleep_for(milliseconds(10));
     }
@@ -181,16 +184,21 @@ TEST_F(CrossProcessTest, TwoClientsEachTakeEverySampleOnce) {
     service_->Close(first);
     service_->Close(second);
 
-    std::set<int64_t> common;
+    std::set<std::pair<int64_t, int64_t>> seen[2];
+    int index = 0;
     for (int32_t handle : {first, second}) {
-        const std::vector<int64_t>& stamps = taken[handle];
-        ASSERT_GE(stamps.size(), 3u) << "handle " << handle;
-        for (size_t i = 1; i < stamps.size(); ++i) {
-            EXPECT_GT(stamps[i], stamps[i - 1]) << "handle " << handle << " took a sample twice";
+        const auto& samples = taken[handle];
+        EXPECT_GE(samples.size(), 3u) << "handle " << handle;
+        for (const auto& sample : samples) {
+            EXPECT_TRUE(seen[index].insert(sample).second)
+                << "handle " << handle << " took the sample at " << sample.first << " ms (frame "
+                << sample.second << ") twice";
         }
+        ++index;
     }
-    std::set_intersection(taken[first].begin(), taken[first].end(), taken[second].begin(),
-                          taken[second].end(), std::inserter(common, common.begin()));
+    std::set<std::pair<int64_t, int64_t>> common;
+    std::set_intersection(seen[0].begin(), seen[0].end(), seen[1].begin(), seen[1].end(),
+                          std::inserter(common, common.begin()));
     EXPECT_FALSE(common.empty()) << "the two handles never took the same sample";
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
@@ -225,46 +233,40 @@ TEST_F(CrossProcessTest, DeathOfAClosedClientChangesNothing) {
     ASSERT_TRUE(service_->Enable(survivor, 50, &result).isOk());
     ASSERT_EQ(result, 0);
 
-    auto shell = Vyrctl({"shell"});
-    std::string h = ShellCommand(shell.get(), "open 3");
-    ASSERT_GT(std::atoi(h.c_str()), 0) << h;
-    ASSERT_EQ(ShellCommand(shell.get(), "callback " + h), "0");
-    ASSERT_EQ(ShellCommand(shell.get(), "enable " + h + " 100"), "0");
-    ASSERT_TRUE(shell->ReadLineStartingWith("event " + h + " ", kWait));
-    ASSERT_EQ(ShellCommand(shell.get(), "disable " + h), "ok");
-    ASSERT_EQ(ShellCommand(shell.get(), "close " + h), "ok");
-    size_t notices_before = 0;
-    for (size_t at = 0;
-         (at = process_->Log().find("Receive binder death callback", at)) != std::string::npos;
-         ++at) {
-        ++notices_before;
-    }
+    // A client that set a callback, then disabled and closed its handle.
+    auto closed = Vyrctl({"shell"});
+    std::string c = ShellCommand(closed.get(), "open 3");
+    ASSERT_GT(std::atoi(c.c_str()), 0) << c;
+    ASSERT_EQ(ShellCommand(closed.get(), "callback " + c), "0");
+    ASSERT_EQ(ShellCommand(closed.get(), "enable " + c + " 100"), "0");
+    ASSERT_TRUE(closed->ReadLineStartingWith("event " + c + " ", kWait));
+    ASSERT_EQ(ShellCommand(closed.get(), "disable " + c), "ok");
+    ASSERT_EQ(ShellCommand(closed.get(), "close " + c), "ok");
 
-    shell->Signal(SIGKILL);
-    ASSERT_TRUE(shell->Wait(kWait));
-    // The notice arrives and finds no client.
-    auto deadline = steady_clock::now() + kWait;
-    size_t notices = notices_before;
-    while (notices == notices_before && steady_clock::now() < deadline) {
-        std::this_thread::sleep_for(milliseconds(50));
-        notices = 0;
-        std::string log = process_->Log();
-        for (size_t at = 0;
-             (at = log.find("Receive binder death callback", at)) != std::string::npos; ++at) {
-            ++notices;
-        }
-    }
-    EXPECT_GT(notices, notices_before) << "no death notice reached the service";
-    EXPECT_EQ(process_->Log().find("client " + h + " mode 3 died"), std::string::npos);
+    // A live client whose death, handled after the first one's, marks the end of the notices.
+    auto live = Vyrctl({"shell"});
+    std::string l = ShellCommand(live.get(), "open 3");
+    ASSERT_GT(std::atoi(l.c_str()), 0) << l;
+    ASSERT_EQ(ShellCommand(live.get(), "callback " + l), "0");
+
+    closed->Signal(SIGKILL);
+    ASSERT_TRUE(closed->Wait(kWait));
+    live->Signal(SIGKILL);
+    ASSERT_TRUE(live->Wait(kWait));
+    ASSERT_TRUE(process_->WaitForLog(
+        "client " + l + " mode 3 died; disable sensor and remove client handle", kWait))
+        << process_->Log();
+    EXPECT_EQ(process_->Log().find("client " + c + " mode 3 died"), std::string::npos);
 
     // The other client goes on sampling, and new clients are served.
     bool fresh_sample = false;
-    deadline = steady_clock::now() + kWait;
+    auto deadline = steady_clock::now() + kWait;
     while (!fresh_sample && steady_clock::now() < deadline) {
         fresh_sample = PollResult(survivor) == 0;
         if (!fresh_sample) std::this_thread::sleep_for(milliseconds(20));
     }
     EXPECT_TRUE(fresh_sample);
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "1", kWait));
     int32_t newcomer = 0;
     ASSERT_TRUE(service_->Open(kRange, &newcomer).isOk());
     EXPECT_GT(newcomer, 0);

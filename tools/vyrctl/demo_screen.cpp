@@ -88,8 +88,8 @@ std::string TorchText(const DemoState& state) {
 
 std::vector<std::string> DemoScreen::Panel(const DemoState& state) {
     char header[128];
-    snprintf(header, sizeof(header), "vyrservice live view   %5.1f s of %.0f s   %s",
-             state.elapsed_s, state.total_s, TorchText(state).c_str());
+    snprintf(header, sizeof(header), "vyrservice live view   %5.1f s of %g s   %s", state.elapsed_s,
+             state.total_s, TorchText(state).c_str());
     std::vector<std::string> lines = {header, ""};
     std::vector<std::string> left = RangeLines(state);
     std::vector<std::string> right = AlsLines(state);

@@ -127,7 +127,8 @@ std::string FormatEventJson(int32_t mode, int32_t handle, const Event& event) {
                 ",\"channels\":" + JsonList(reading.channels);
     } else if (mode == kModeRange) {
         RangeFrame frame = DecodeRange(event);
-        json += ",\"zone_count\":" + std::to_string(frame.reported_zones) + ",\"zones\":[";
+        json += ",\"frame_number\":" + FormatFloat(frame.frame_number) +
+                ",\"zone_count\":" + std::to_string(frame.reported_zones) + ",\"zones\":[";
         for (size_t i = 0; i < frame.zones.size(); ++i) {
             if (i > 0) json += ",";
             json += "{\"status\":" + std::to_string(frame.zones[i].target_status) +
