@@ -1,0 +1,233 @@
+#include "display_fixture.h"
+
+#include <dirent.h>
+#include <limits.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <fstream>
+#include <future>
+#include <thread>
+
+#include "uts_namespace.h"
+
+namespace vyr_display_test {
+namespace {
+
+constexpr char kAlsProperty[] = "persist.vendor.camera.vyr_supported";
+constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_supported";
+
+bool UnderCi() {
+    const char* ci = getenv("CI");
+    return ci != nullptr && std::string(ci) == "true";
+}
+
+bool WaitUntil(const std::function<bool()>& condition, std::chrono::milliseconds timeout) {
+    const auto deadline = std::chrono::steady_clock::now() + timeout;
+    while (!condition()) {
+        if (std::chrono::steady_clock::now() >= deadline) return false;
+        std::this_thread::sleep_for(2ms);
+    }
+    return true;
+}
+
+size_t CountWork(const std::vector<vyr_test::LogRecord>& records, const std::string& work,
+                 int32_t handle) {
+    // EnableWork prints "handle:%x sampling", DisableWork "handle:%x, active_period".
+    const std::string needle = "handle:" + Hex(handle) + (work == "EnableWork" ? " " : ",");
+    size_t count = 0;
+    for (const auto& record : records) {
+        if (record.tag == kTag && record.priority == ANDROID_LOG_INFO &&
+            record.message.rfind(work + " ", 0) == 0 &&
+            record.message.find(needle) != std::string::npos) {
+            ++count;
+        }
+    }
+    return count;
+}
+
+// The descriptor on which the display monitor watches the attribute (the test itself never keeps
+// one open), or -1.
+int MonitorDescriptor() {
+    DIR* dir = opendir("/proc/self/fd");
+    if (dir == nullptr) return -1;
+    int found = -1;
+    while (dirent* entry = readdir(dir)) {
+        char target[PATH_MAX];
+        const std::string link = std::string("/proc/self/fd/") + entry->d_name;
+        const ssize_t length = readlink(link.c_str(), target, sizeof(target) - 1);
+        if (length > 0 && std::string(target, length) == kStatePath) found = atoi(entry->d_name);
+    }
+    closedir(dir);
+    return found;
+}
+
+}  // namespace
+
+std::string Hex(int32_t value) {
+    char text[16];
+    snprintf(text, sizeof(text), "%x", static_cast<unsigned>(value));
+    return text;
+}
+
+size_t ThreadCount() {
+    size_t count = 0;
+    DIR* dir = opendir("/proc/self/task");
+    if (dir == nullptr) return 0;
+    while (dirent* entry = readdir(dir)) {
+        if (entry->d_name[0] != '.') ++count;
+    }
+    closedir(dir);
+    return count;
+}
+
+bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
+    return WaitUntil([count] { return ThreadCount() == count; }, timeout);
+}
+
+void DisplayTest::SetUp() {
+    if (!HaveOwnUtsNamespace()) {
+        if (UnderCi()) GTEST_FAIL() << UtsNamespaceProblem();
+        GTEST_SKIP() << UtsNamespaceProblem();
+    }
+    sensor_doubles::Reset();
+    Panel("Off");
+    baseline_threads_ = ThreadCount();
+}
+
+void DisplayTest::TearDown() {
+    if (!HaveOwnUtsNamespace()) return;
+    if (service_ != nullptr && panel_ != "Off") {
+        // A test that failed while the panel was lit: stop the display's sampling first, since
+        // destruction does not stop processing threads.
+        Panel("Off");
+        WaitForBlock(kAlsBlock, [](const VYRService::ModeBlockSnapshot& block) {
+            return block.enable_count <= 0 && !block.running;
+        });
+    }
+    EXPECT_TRUE(DestroyService());
+    sensor_doubles::Reset();
+    EXPECT_TRUE(WaitForThreadCount(baseline_threads_, 5s))
+        << "threads left: " << ThreadCount() << ", expected " << baseline_threads_;
+}
+
+void DisplayTest::MakeService(bool als, bool range) {
+    ServiceConfig config;
+    config.get_bool_property = [als, range](const char* key, bool default_value) {
+        if (std::string(key) == kAlsProperty) return als;
+        if (std::string(key) == kRangeProperty) return range;
+        return default_value;
+    };
+    config.startup_delay = 0ms;
+    config.display_state_path = kStatePath;
+    service_ = ndk::SharedRefBase::make<VYRService>(config);
+}
+
+bool DisplayTest::DestroyService() {
+    if (service_ == nullptr) return true;
+    std::future<void> destroyed = StartDestruction();
+    // Each notification lets the monitor look at the service's running flag once more.
+    if (!NotifyUntil([&] { return destroyed.wait_for(0s) == std::future_status::ready; }, kWait)) {
+        ADD_FAILURE() << "the service was not destroyed within " << kWait.count() << " s";
+        // The destruction may still use the doubles and the log capture: wait for it regardless.
+        destroyed.wait();
+        return false;
+    }
+    return true;
+}
+
+void DisplayTest::Panel(const std::string& state) {
+    panel_ = state;
+    ASSERT_EQ(0, sethostname(state.data(), state.size())) << strerror(errno);
+}
+
+bool DisplayTest::MonitorWatching() {
+    return MonitorDescriptor() >= 0;
+}
+
+bool DisplayTest::WaitForMonitorWatching(bool watching) {
+    return WaitUntil([watching] { return MonitorWatching() == watching; }, kWait);
+}
+
+size_t DisplayTest::EnableLines(const std::string& shown) {
+    return log_.Count(kTag, ANDROID_LOG_INFO, "Enable sensor for display state: " + shown);
+}
+
+size_t DisplayTest::DisableLines(const std::string& shown) {
+    return log_.Count(kTag, ANDROID_LOG_INFO, "Disable sensor for display state: " + shown);
+}
+
+bool DisplayTest::WaitForEnableLine(const std::string& shown, size_t count) {
+    return log_.WaitFor(kTag, ANDROID_LOG_INFO, "Enable sensor for display state: " + shown, kWait,
+                        count);
+}
+
+bool DisplayTest::WaitForDisableLine(const std::string& shown, size_t count) {
+    return log_.WaitFor(kTag, ANDROID_LOG_INFO, "Disable sensor for display state: " + shown, kWait,
+                        count);
+}
+
+bool DisplayTest::WaitForMonitorRead(size_t length) {
+    return WaitUntil(
+        [length] {
+            const int fd = MonitorDescriptor();
+            if (fd < 0) return false;
+            std::ifstream info("/proc/self/fdinfo/" + std::to_string(fd));
+            std::string key;
+            size_t position = 0;
+            return static_cast<bool>(info >> key >> position) && key == "pos:" && position == length;
+        },
+        kWait);
+}
+
+bool DisplayTest::WaitForBlock(
+    size_t index, const std::function<bool(const VYRService::ModeBlockSnapshot&)>& condition) {
+    return WaitUntil([&] { return condition(service_->SnapshotModeBlock(index)); }, kWait);
+}
+
+std::future<void> DisplayTest::StartDestruction() {
+    return std::async(std::launch::async,
+                      [service = std::move(service_)]() mutable { service.reset(); });
+}
+
+bool DisplayTest::NotifyUntil(const std::function<bool()>& done, std::chrono::milliseconds timeout) {
+    const auto deadline = std::chrono::steady_clock::now() + timeout;
+    while (!done()) {
+        if (std::chrono::steady_clock::now() >= deadline) return false;
+        Panel(panel_);
+        std::this_thread::sleep_for(20ms);
+    }
+    return true;
+}
+
+size_t DisplayTest::WorkLines(const std::string& work, int32_t handle) {
+    return CountWork(log_.Records(), work, handle);
+}
+
+bool DisplayTest::WaitForWorkLines(const std::string& work, int32_t handle, size_t count) {
+    return log_.WaitUntil(
+        [&](const std::vector<vyr_test::LogRecord>& records) {
+            return CountWork(records, work, handle) >= count;
+        },
+        kWait);
+}
+
+std::string DisplayTest::EnableWorkText(int32_t count, int32_t handle, int32_t period,
+                                        int32_t active) {
+    return "EnableWork mode 1, enable count " + std::to_string(count) + ", handle:" + Hex(handle) +
+           " sampling/active period " + std::to_string(period) + "/" + std::to_string(active) +
+           ", sensor type:0";
+}
+
+std::string DisplayTest::DisableWorkText(int32_t count, int32_t handle, int32_t active) {
+    return "DisableWork mode 1, enable count " + std::to_string(count) + ", handle:" + Hex(handle) +
+           ", active_period:" + std::to_string(active) + ", sensor type:0";
+}
+
+int32_t DisplayTest::DisplayHandle() {
+    const auto block = service_->SnapshotModeBlock(kAlsBlock);
+    EXPECT_EQ(1u, block.periods.size());
+    return block.periods.empty() ? 0 : block.periods.begin()->first;
+}
+
+}  // namespace vyr_display_test

@@ -1,0 +1,89 @@
+#pragma once
+
+#include <aidl/android/vyr/IVYRService.h>
+#include <android/log.h>
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <cstdint>
+#include <functional>
+#include <future>
+#include <memory>
+#include <string>
+
+#include "log_capture.h"
+#include "sensor_doubles.h"
+#include "vyrservice.h"
+
+namespace vyr_display_test {
+
+using android::vyr::binder::ServiceConfig;
+using android::vyr::binder::VYRService;
+using namespace std::chrono_literals;
+
+inline constexpr char kTag[] = "vyrservice";
+inline constexpr auto kWait = 10s;
+// The kernel's hostname attribute: poll() reports POLLPRI|POLLERR on every sethostname(), and a
+// read returns this namespace's hostname and a newline.
+inline constexpr char kStatePath[] = "/proc/sys/kernel/hostname";
+inline constexpr int32_t kAlsBlock = 0;
+inline constexpr int32_t kRangeBlock = 2;
+
+std::string Hex(int32_t value);
+size_t ThreadCount();
+bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout);
+
+// Builds the service on the sensor doubles with the display monitor watching the hostname
+// attribute, and drives the "panel" through sethostname(). Needs a UTS namespace of its own
+// (root); skips without one, and fails under CI=true.
+class DisplayTest : public ::testing::Test {
+  protected:
+    void SetUp() override;
+    void TearDown() override;
+
+    // Both properties as given; the service is built with the panel dark ("Off").
+    void MakeService(bool als = true, bool range = true);
+    // Destroys the service on another thread, waking the display monitor (which blocks in poll()
+    // without a time-out) until the destruction has finished. False if it did not within kWait.
+    bool DestroyService();
+
+    // Sets the attribute's content; the monitor reads it with a trailing newline.
+    void Panel(const std::string& state);
+    // Whether the display monitor has the state attribute open.
+    static bool MonitorWatching();
+    static bool WaitForMonitorWatching(bool watching);
+
+    // Records "Enable/Disable sensor for display state: <shown>": `shown` is what the monitor
+    // read, at most 49 bytes, usually the panel state and a newline.
+    size_t EnableLines(const std::string& shown);
+    size_t DisableLines(const std::string& shown);
+    bool WaitForEnableLine(const std::string& shown, size_t count = 1);
+    bool WaitForDisableLine(const std::string& shown, size_t count = 1);
+    // Waits until the monitor has read `length` bytes from the start of the attribute: the
+    // position of its descriptor tells how far its last read went.
+    static bool WaitForMonitorRead(size_t length);
+    // Waits until the light or range block satisfies `condition`.
+    bool WaitForBlock(size_t index,
+                      const std::function<bool(const VYRService::ModeBlockSnapshot&)>& condition);
+    // Starts destroying the service on another thread.
+    std::future<void> StartDestruction();
+    // Sets the panel state again every 20 ms (waking the display monitor without changing what
+    // it reads) until `done` is true; false on time-out.
+    bool NotifyUntil(const std::function<bool()>& done, std::chrono::milliseconds timeout);
+    // Records of the worker's "EnableWork"/"DisableWork" line for `handle`.
+    size_t WorkLines(const std::string& work, int32_t handle);
+    bool WaitForWorkLines(const std::string& work, int32_t handle, size_t count);
+    // Exact text of the worker's lines for mode 1.
+    static std::string EnableWorkText(int32_t count, int32_t handle, int32_t period, int32_t active);
+    static std::string DisableWorkText(int32_t count, int32_t handle, int32_t active);
+
+    // The only handle with a period in the light block: the display's, while no client enabled.
+    int32_t DisplayHandle();
+
+    vyr_test::LogCapture log_;
+    std::shared_ptr<VYRService> service_;
+    size_t baseline_threads_ = 0;
+    std::string panel_ = "Off";
+};
+
+}  // namespace vyr_display_test

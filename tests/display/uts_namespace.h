@@ -1,0 +1,12 @@
+#pragma once
+
+#include <string>
+
+namespace vyr_display_test {
+
+// Set by main() before any thread exists: whether this process has a UTS namespace of its own,
+// and if not, why.
+bool HaveOwnUtsNamespace();
+const std::string& UtsNamespaceProblem();
+
+}  // namespace vyr_display_test
