@@ -145,10 +145,9 @@ TEST(InProcessTest, ServiceLookedUpInItsOwnProcessIsTheLocalObject) {
 
 TEST(InProcessTest, WeakReferencePromotesOnlyWhileAlive) {
     auto service = ndk::SharedRefBase::make<TestService>();
-    AIBinder* binder = service->asBinder().get();
     ndk::SpAIBinder strong = service->asBinder();
     ndk::ScopedAIBinder_Weak weak(AIBinder_Weak_new(strong.get()));
-    EXPECT_EQ(binder, weak.promote().get());
+    EXPECT_EQ(strong.get(), weak.promote().get());
     strong.set(nullptr);
     EXPECT_EQ(nullptr, weak.promote().get());
 }
