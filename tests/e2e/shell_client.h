@@ -1,0 +1,28 @@
+#pragma once
+
+#include <chrono>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "child_process.h"
+
+namespace vyr_e2e {
+
+// A `vyrctl shell` client process: one command line in, one "<command> -> <result>" line out.
+class ShellClient {
+  public:
+    ShellClient(const std::vector<std::string>& env, const std::string& stderr_path);
+
+    // The leading number of the command's result, or nothing when no result line came.
+    std::optional<int64_t> Call(const std::string& command);
+    // Repeats `command` until its result is `expected`; false on time-out.
+    bool CallUntil(const std::string& command, int64_t expected, std::chrono::milliseconds timeout);
+    ChildProcess& process() { return *process_; }
+
+  private:
+    std::unique_ptr<ChildProcess> process_;
+};
+
+}  // namespace vyr_e2e
