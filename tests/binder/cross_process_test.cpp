@@ -591,11 +591,10 @@ TEST_F(MalformedFrameTest, CallToUnknownObjectIsAnsweredDeadObject) {
     header.code = FIRST_CALL_TRANSACTION;
     SendBytes(fd, &header, sizeof(header));
     // The helper's HELLO, then the reply.
-    vyr_binder::FrameReader reader(fd);
-    vyr_binder::FrameView frame;
-    ASSERT_EQ(vyr_binder::FrameReader::Result::kFrame, reader.Read(&frame));
+    vyr_binder::Frame frame;
+    ASSERT_EQ(vyr_binder::ReadResult::kFrame, vyr_binder::ReadFrame(fd, true, &frame));
     EXPECT_EQ(static_cast<uint32_t>(vyr_binder::FrameType::kHello), frame.header.type);
-    ASSERT_EQ(vyr_binder::FrameReader::Result::kFrame, reader.Read(&frame));
+    ASSERT_EQ(vyr_binder::ReadResult::kFrame, vyr_binder::ReadFrame(fd, true, &frame));
     EXPECT_EQ(static_cast<uint32_t>(vyr_binder::FrameType::kReply), frame.header.type);
     EXPECT_EQ(static_cast<uint32_t>(STATUS_DEAD_OBJECT), frame.header.code);
     close(fd);

@@ -3,17 +3,17 @@
 #include "process_state.h"
 
 void ABinderProcess_startThreadPool(void) {
-    vyr_binder::ProcessState::Get().pool().Start();
+    vyr_binder::ProcessState::Get().looper().StartPool();
 }
 
 bool ABinderProcess_setThreadPoolMaxThreadCount(uint32_t numThreads) {
-    return vyr_binder::ProcessState::Get().pool().SetMaxThreads(numThreads);
+    return vyr_binder::ProcessState::Get().looper().SetMaxThreads(numThreads);
 }
 
 bool ABinderProcess_isThreadPoolStarted(void) {
-    return vyr_binder::ProcessState::Get().pool().IsStarted();
+    return vyr_binder::ProcessState::Get().looper().IsStarted();
 }
 
 void ABinderProcess_joinThreadPool(void) {
-    vyr_binder::ProcessState::Get().pool().Join();
+    vyr_binder::ProcessState::Get().looper().Join();
 }

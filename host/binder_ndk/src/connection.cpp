@@ -1,16 +1,18 @@
 #include "connection.h"
 
+#include "call_context.h"
+#include "frame_io.h"
+#include "local_binder.h"
+#include "looper.h"
+#include "process_state.h"
+#include "proxy_binder.h"
+
 #include <android/binder_parcel_utils.h>
+#include <fcntl.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
 #include <utility>
-
-#include "call_context.h"
-#include "frame_io.h"
-#include "local_binder.h"
-#include "process_state.h"
-#include "proxy_binder.h"
 
 namespace vyr_binder {
 namespace {
@@ -20,9 +22,14 @@ constexpr uint64_t kContextObject = 0;
 constexpr transaction_code_t kLookupCode = 1;
 constexpr size_t kMaxKeyBytes = 128;
 
+Looper& TheLooper() {
+    return ProcessState::Get().looper();
+}
+
 }  // namespace
 
 Connection::Connection(int fd) : fd_(fd) {
+    fcntl(fd_, F_SETFL, fcntl(fd_, F_GETFL) | O_NONBLOCK);
     ucred cred{};
     socklen_t len = sizeof(cred);
     if (getsockopt(fd_, SOL_SOCKET, SO_PEERCRED, &cred, &len) == 0) {
@@ -39,31 +46,48 @@ void Connection::Start(const std::string& own_key) {
     AParcel hello;
     hello.data.assign(own_key.begin(), own_key.end());
     if (!Send(FrameType::kHello, 0, 0, 0, 0, 0, &hello, {})) Close();
-    std::shared_ptr<Connection> self = shared_from_this();
-    std::lock_guard<std::mutex> lock(thread_mutex_);
-    reader_ = std::thread([self] { self->ReadLoop(); });
-}
-
-void Connection::ReadLoop() {
-    FrameReader reader(fd_);
-    FrameView frame;
-    while (reader.Read(&frame) == FrameReader::Result::kFrame) {
-        if (!HandleFrame(frame)) break;
-    }
-    Die();
-    std::thread self;
-    {
-        std::lock_guard<std::mutex> lock(thread_mutex_);
-        self = std::move(reader_);
-    }
-    ProcessState::Get().Retire(shared_from_this(), std::move(self));
 }
 
 void Connection::Close() {
     shutdown(fd_, SHUT_RDWR);
 }
 
-bool Connection::HandleFrame(const FrameView& frame) {
+void Connection::OnReadable(bool can_serve) {
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        // Whoever holds the role re-arms the looper when done.
+        if (reading_ || dead_.load(std::memory_order_relaxed)) return;
+        reading_ = true;
+    }
+    std::shared_ptr<Incoming> call;
+    bool alive = ReadAndHandle(false, &call);
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        reading_ = false;
+        if (alive && !dead_.load(std::memory_order_relaxed)) TheLooper().Arm(*this);
+    }
+    if (!alive) {
+        Die();
+        return;
+    }
+    if (call != nullptr) Dispatch(std::move(call), can_serve);
+}
+
+bool Connection::ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call) {
+    Frame frame;
+    switch (ReadFrame(fd_, wait, &frame)) {
+        case ReadResult::kNoData:
+            return true;
+        case ReadResult::kFrame:
+            return HandleFrame(frame, call);
+        case ReadResult::kClosed:
+        case ReadResult::kMalformed:
+            return false;
+    }
+    return false;
+}
+
+bool Connection::HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call) {
     const FrameHeader& header = frame.header;
     switch (static_cast<FrameType>(header.type)) {
         case FrameType::kHello: {
@@ -73,7 +97,7 @@ bool Connection::HandleFrame(const FrameView& frame) {
                 if (hello_seen_) return false;
                 hello_seen_ = true;
             }
-            std::string key(reinterpret_cast<const char*>(frame.data), header.data_size);
+            std::string key(frame.data.begin(), frame.data.end());
             ProcessState::Get().NamePeer(shared_from_this(), key);
             return true;
         }
@@ -81,19 +105,20 @@ bool Connection::HandleFrame(const FrameView& frame) {
             HandleRelease(header.target, header.code);
             return true;
         case FrameType::kTransaction:
-            return HandleTransaction(frame);
+            return HandleTransaction(frame, call);
         case FrameType::kReply:
             return HandleReply(frame);
     }
     return false;
 }
 
-bool Connection::DecodeParcel(const FrameView& frame, AParcel* parcel) {
+bool Connection::DecodeParcel(Frame& frame, AParcel* parcel) {
     std::vector<WireObject> objects;
-    if (!DecodeObjects(frame.table, frame.header.table_size, frame.header.object_count, &objects)) {
+    if (!DecodeObjects(frame.table.data(), frame.table.size(), frame.header.object_count,
+                       &objects)) {
         return false;
     }
-    parcel->data.assign(frame.data, frame.data + frame.header.data_size);
+    parcel->data = std::move(frame.data);
     std::vector<ParcelObject> resolved;
     resolved.reserve(objects.size());
     bool ok = true;
@@ -164,7 +189,8 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
                                                 std::vector<WireObject>* objects) {
     for (const ParcelObject& object : parcel.objects) {
         AIBinder* binder = object.binder.get();
-        if (binder->IsRemote() && static_cast<ProxyBinder*>(binder)->connection().get() != this) {
+        if (binder->IsRemote() &&
+            static_cast<ProxyBinder*>(binder)->connection().get() != this) {
             // Handing a third process's object on is not supported.
             return STATUS_INVALID_OPERATION;
         }
@@ -173,8 +199,8 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
     for (const ParcelObject& object : parcel.objects) {
         AIBinder* binder = object.binder.get();
         if (binder->IsRemote()) {
-            objects->push_back(WireObject{
-                ObjectKind::kReceiverObject, static_cast<ProxyBinder*>(binder)->remote_id(), {}});
+            objects->push_back(WireObject{ObjectKind::kReceiverObject,
+                                          static_cast<ProxyBinder*>(binder)->remote_id(), {}});
             continue;
         }
         LocalBinder* local = static_cast<LocalBinder*>(binder);
@@ -187,11 +213,11 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
     return STATUS_OK;
 }
 
-bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
-                      uint64_t parent, const AParcel* parcel,
+bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id,
+                      uint64_t target, uint64_t parent, const AParcel* parcel,
                       const std::vector<WireObject>& objects) {
     std::vector<uint8_t> table;
-    EncodeObjects(objects, &table);
+    if (!objects.empty()) EncodeObjects(objects, &table);
     FrameHeader header{};
     header.magic = kFrameMagic;
     header.type = static_cast<uint32_t>(type);
@@ -235,17 +261,47 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
 
     std::unique_lock<std::mutex> lock(mutex_);
     while (!waiter.done) {
-        if (waiter.nested.empty()) {
+        if (!waiter.nested.empty()) {
+            // The peer calls back into us while serving our call: serve it on this thread.
+            std::shared_ptr<Incoming> call = std::move(waiter.nested.front());
+            waiter.nested.pop_front();
+            lock.unlock();
+            Serve(*call);
+            call.reset();
+            lock.lock();
+            continue;
+        }
+        if (reading_ || dead_.load(std::memory_order_relaxed)) {
             waiter.cv.wait(lock);
             continue;
         }
-        // The peer calls back into us while serving our call: serve it on this thread.
-        std::shared_ptr<Incoming> call = std::move(waiter.nested.front());
-        waiter.nested.pop_front();
+        // Nobody is reading: read for ourselves, sparing a hand-over for our reply.
+        reading_ = true;
+        TheLooper().Disarm(*this);
         lock.unlock();
-        Serve(*call);
-        call.reset();
+        std::shared_ptr<Incoming> call;
+        bool alive = ReadAndHandle(true, &call);
         lock.lock();
+        reading_ = false;
+        if (!alive) {
+            lock.unlock();
+            Die();
+            lock.lock();
+            continue;
+        }
+        if (!dead_.load(std::memory_order_relaxed)) TheLooper().Arm(*this);
+        // Another caller may be asleep waiting for the role.
+        for (auto& entry : waiters_) {
+            if (entry.second != &waiter && !entry.second->done) {
+                entry.second->cv.notify_one();
+                break;
+            }
+        }
+        if (call != nullptr) {
+            lock.unlock();
+            Dispatch(std::move(call), false);
+            lock.lock();
+        }
     }
     waiters_.erase(id);
     std::deque<std::shared_ptr<Incoming>> dropped = std::move(waiter.nested);
@@ -261,7 +317,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
     return status;
 }
 
-bool Connection::HandleReply(const FrameView& frame) {
+bool Connection::HandleReply(Frame& frame) {
     std::unique_ptr<AParcel> reply(new AParcel);
     if (!DecodeParcel(frame, reply.get())) return false;
     std::lock_guard<std::mutex> lock(mutex_);
@@ -275,8 +331,8 @@ bool Connection::HandleReply(const FrameView& frame) {
     return true;
 }
 
-bool Connection::HandleTransaction(const FrameView& frame) {
-    const FrameHeader& header = frame.header;
+bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out) {
+    const FrameHeader header = frame.header;
     auto call = std::make_shared<Incoming>();
     call->id = header.transaction_id;
     call->code = header.code;
@@ -305,17 +361,40 @@ bool Connection::HandleTransaction(const FrameView& frame) {
         if (!oneway) SendReply(call->id, STATUS_DEAD_OBJECT, AParcel());
         return true;
     }
-    std::shared_ptr<Connection> self = shared_from_this();
     if (oneway) {
-        ProcessState::Get().pool().Enqueue([self, call] {
-            static_cast<LocalBinder*>(call->target.get())->RunOneway([self, call] {
-                self->Serve(*call);
-            });
-        });
-    } else {
-        ProcessState::Get().pool().Enqueue([self, call] { self->Serve(*call); });
+        // Queued now, while the frames are still taken in order.
+        std::shared_ptr<Connection> self = shared_from_this();
+        LocalBinder* local = static_cast<LocalBinder*>(call->target.get());
+        if (local->QueueOneway([self, call] { self->Serve(*call); })) {
+            auto drain = std::make_shared<Incoming>();
+            drain->drain_oneway = true;
+            drain->target = call->target;
+            *out = std::move(drain);
+        }
+        return true;
     }
+    *out = std::move(call);
     return true;
+}
+
+void Connection::Dispatch(std::shared_ptr<Incoming> call, bool can_serve) {
+    if (call->drain_oneway) {
+        ndk::SpAIBinder target = call->target;
+        if (can_serve) {
+            static_cast<LocalBinder*>(target.get())->DrainOneway();
+        } else {
+            TheLooper().Enqueue(
+                    [target] { static_cast<LocalBinder*>(target.get())->DrainOneway(); });
+        }
+        return;
+    }
+    if (can_serve) {
+        TheLooper().BeforeServingInline();
+        Serve(*call);
+        return;
+    }
+    std::shared_ptr<Connection> self = shared_from_this();
+    TheLooper().Enqueue([self, call] { self->Serve(*call); });
 }
 
 void Connection::Serve(Incoming& call) {
@@ -323,7 +402,7 @@ void Connection::Serve(Incoming& call) {
     AParcel reply;
     call.data->pos = 0;
     binder_status_t status =
-        call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
+            call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
     if ((call.flags & FLAG_ONEWAY) == 0) SendReply(call.id, status, reply);
 }
 
@@ -389,9 +468,19 @@ void Connection::Die() {
         exports.swap(exports_);
     }
     shutdown(fd_, SHUT_RDWR);
+    std::shared_ptr<Connection> self = shared_from_this();
+    TheLooper().Remove(*this);
     exports.clear();
-    for (const ndk::SpAIBinder& proxy : proxies) {
-        static_cast<ProxyBinder*>(proxy.get())->SendObituaries();
+    auto notify = [proxies = std::move(proxies)] {
+        for (const ndk::SpAIBinder& proxy : proxies) {
+            static_cast<ProxyBinder*>(proxy.get())->SendObituaries();
+        }
+    };
+    // Death notices run on a runtime thread, never on a caller's.
+    if (Looper::OnRuntimeThread()) {
+        notify();
+    } else {
+        TheLooper().RunTask(std::move(notify));
     }
 }
 

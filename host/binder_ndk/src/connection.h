@@ -11,7 +11,6 @@
 #include <memory>
 #include <mutex>
 #include <string>
-#include <thread>
 #include <unordered_map>
 #include <vector>
 
@@ -21,11 +20,12 @@
 namespace vyr_binder {
 
 class ProxyBinder;
-struct FrameView;
+struct Frame;
 
-// One socket to one peer process, used both ways. A reader thread takes every frame off the
-// socket: replies go to the thread waiting for them, calls nested in one of ours go to the
-// thread that made it, other calls go to the thread pool.
+// One socket to one peer process, used both ways. One thread at a time reads it (it holds the
+// reading role): a caller waiting for its reply reads for itself when nobody else is, otherwise
+// a runtime thread woken by the looper does. Replies go to the thread waiting for them, calls
+// nested in one of ours to the thread that made it, other calls to a pool thread.
 class Connection : public std::enable_shared_from_this<Connection> {
   public:
     // Takes a connected socket; the peer's credentials come from the socket.
@@ -34,8 +34,14 @@ class Connection : public std::enable_shared_from_this<Connection> {
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
 
-    // Introduces this process and starts reading.
+    // Introduces this process; the connection must already be in the looper.
     void Start(const std::string& own_key);
+    // The looper saw data: read one frame, then serve a call in it here (can_serve) or queue it.
+    void OnReadable(bool can_serve);
+
+    int fd() const { return fd_; }
+    uint64_t serial() const { return serial_; }
+    void set_serial(uint64_t serial) { serial_ = serial; }
 
     binder_status_t Transact(uint64_t target, transaction_code_t code, const AParcel& in,
                              AParcel* out, binder_flags_t flags);
@@ -57,6 +63,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
         uint32_t flags;
         std::unique_ptr<AParcel> data;
         ndk::SpAIBinder target;
+        bool drain_oneway = false;  // run the target's queued oneway calls instead
     };
     // A thread waiting for the reply to one of its transactions.
     struct Waiter {
@@ -71,18 +78,21 @@ class Connection : public std::enable_shared_from_this<Connection> {
         uint64_t count = 0;
     };
 
-    void ReadLoop();
+    // Takes the next frame off the socket and handles it in stream order; a call to run is left
+    // in `call`. False when the connection is finished.
+    bool ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call);
     // False when the peer broke the protocol.
-    bool HandleFrame(const FrameView& frame);
-    bool HandleTransaction(const FrameView& frame);
-    bool HandleReply(const FrameView& frame);
+    bool HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call);
+    bool HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* call);
+    bool HandleReply(Frame& frame);
     void HandleRelease(uint64_t id, uint32_t count);
+    void Dispatch(std::shared_ptr<Incoming> call, bool can_serve);
     void ServeContextCall(Incoming& call);
     void Serve(Incoming& call);
     void Die();
 
     // Resolves the object table of a received parcel into binders.
-    bool DecodeParcel(const FrameView& frame, AParcel* parcel);
+    bool DecodeParcel(Frame& frame, AParcel* parcel);
     binder_status_t EncodeObjectsLocked(const AParcel& parcel, std::vector<WireObject>* objects);
     ndk::SpAIBinder ProxyForLocked(uint64_t id, const std::string& descriptor);
     bool Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
@@ -90,6 +100,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
 
     const int fd_;
+    uint64_t serial_ = 0;
     pid_t peer_pid_ = -1;
     uid_t peer_uid_ = static_cast<uid_t>(-1);
     std::atomic<bool> dead_{false};
@@ -102,9 +113,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::unordered_map<uint64_t, Export> exports_;
     std::unordered_map<uint64_t, ProxyBinder*> proxies_;
     bool hello_seen_ = false;
-
-    std::mutex thread_mutex_;
-    std::thread reader_;
+    bool reading_ = false;  // the reading role is taken
 };
 
 }  // namespace vyr_binder

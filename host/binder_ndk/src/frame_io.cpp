@@ -1,6 +1,7 @@
 #include "frame_io.h"
 
 #include <errno.h>
+#include <poll.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
 
@@ -9,60 +10,71 @@
 namespace vyr_binder {
 namespace {
 
-constexpr size_t kReadChunk = 64 * 1024;
+// How long the rest of a started frame, or room to send one, may take to come.
+constexpr int kStallMillis = 10000;
+
+enum class Chunk { kDone, kNoData, kClosed, kStalled };
+
+// Reads `size` bytes. Before the first byte it waits for ever (wait) or not at all.
+Chunk ReadExact(int fd, uint8_t* buffer, size_t size, bool wait_for_first) {
+    size_t done = 0;
+    while (done < size) {
+        ssize_t n = recv(fd, buffer + done, size - done, MSG_DONTWAIT);
+        if (n > 0) {
+            done += static_cast<size_t>(n);
+            continue;
+        }
+        if (n == 0) return Chunk::kClosed;
+        if (errno == EINTR) continue;
+        if (errno != EAGAIN && errno != EWOULDBLOCK) return Chunk::kClosed;
+        if (done == 0 && !wait_for_first) return Chunk::kNoData;
+        pollfd p{fd, POLLIN, 0};
+        int ready = poll(&p, 1, done == 0 ? -1 : kStallMillis);
+        if (ready == 0) return Chunk::kStalled;
+        if (ready < 0 && errno != EINTR) return Chunk::kClosed;
+    }
+    return Chunk::kDone;
+}
 
 }  // namespace
 
-bool FrameReader::Fill(size_t needed) {
-    if (end_ - begin_ >= needed) return true;
-    if (begin_ > 0) {
-        std::memmove(buffer_.data(), buffer_.data() + begin_, end_ - begin_);
-        end_ -= begin_;
-        begin_ = 0;
+ReadResult ReadFrame(int fd, bool wait, Frame* frame) {
+    uint8_t* header = reinterpret_cast<uint8_t*>(&frame->header);
+    Chunk chunk = ReadExact(fd, header, sizeof(FrameHeader), wait);
+    if (chunk == Chunk::kNoData) return ReadResult::kNoData;
+    if (chunk == Chunk::kStalled) return ReadResult::kMalformed;
+    if (chunk != Chunk::kDone) return ReadResult::kClosed;
+    if (!ValidateHeader(frame->header)) return ReadResult::kMalformed;
+    frame->data.resize(frame->header.data_size);
+    frame->table.resize(frame->header.table_size);
+    for (std::vector<uint8_t>* part : {&frame->data, &frame->table}) {
+        if (part->empty()) continue;
+        chunk = ReadExact(fd, part->data(), part->size(), true);
+        if (chunk == Chunk::kStalled) return ReadResult::kMalformed;
+        if (chunk != Chunk::kDone) return ReadResult::kClosed;
     }
-    if (buffer_.size() < needed || buffer_.size() < kReadChunk) {
-        buffer_.resize(needed > kReadChunk ? needed : kReadChunk);
-    }
-    while (end_ < needed) {
-        ssize_t n = recv(fd_, buffer_.data() + end_, buffer_.size() - end_, 0);
-        if (n > 0) {
-            end_ += static_cast<size_t>(n);
-        } else if (n == 0 || errno != EINTR) {
-            return false;
-        }
-    }
-    return true;
-}
-
-FrameReader::Result FrameReader::Read(FrameView* frame) {
-    // A frame consumed by the previous call is dropped only now, so its views stayed valid.
-    if (!Fill(sizeof(FrameHeader))) return Result::kClosed;
-    std::memcpy(&frame->header, buffer_.data() + begin_, sizeof(FrameHeader));
-    if (!ValidateHeader(frame->header)) return Result::kMalformed;
-    size_t body = size_t{frame->header.data_size} + frame->header.table_size;
-    if (!Fill(sizeof(FrameHeader) + body)) return Result::kClosed;
-    frame->data = buffer_.data() + begin_ + sizeof(FrameHeader);
-    frame->table = frame->data + frame->header.data_size;
-    begin_ += sizeof(FrameHeader) + body;
-    return Result::kFrame;
+    return ReadResult::kFrame;
 }
 
 bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
                const std::vector<uint8_t>& table) {
     iovec iov[3] = {
-        {const_cast<FrameHeader*>(&header), sizeof(header)},
-        {const_cast<uint8_t*>(data), header.data_size},
-        {const_cast<uint8_t*>(table.data()), table.size()},
+            {const_cast<FrameHeader*>(&header), sizeof(header)},
+            {const_cast<uint8_t*>(data), header.data_size},
+            {const_cast<uint8_t*>(table.data()), table.size()},
     };
     size_t first = 0;
     while (first < 3) {
         msghdr msg{};
         msg.msg_iov = iov + first;
         msg.msg_iovlen = 3 - first;
-        ssize_t n = sendmsg(fd, &msg, MSG_NOSIGNAL);
+        ssize_t n = sendmsg(fd, &msg, MSG_NOSIGNAL | MSG_DONTWAIT);
         if (n < 0) {
             if (errno == EINTR) continue;
-            return false;
+            if (errno != EAGAIN && errno != EWOULDBLOCK) return false;
+            pollfd p{fd, POLLOUT, 0};
+            if (poll(&p, 1, kStallMillis) == 0) return false;
+            continue;
         }
         size_t sent = static_cast<size_t>(n);
         while (first < 3 && sent >= iov[first].iov_len) {

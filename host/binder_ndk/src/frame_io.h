@@ -1,39 +1,28 @@
 #pragma once
 
-#include <cstddef>
+#include "wire.h"
+
 #include <cstdint>
 #include <vector>
 
-#include "wire.h"
-
 namespace vyr_binder {
 
-// A received frame; data and table point into the reader's buffer until the next Read.
-struct FrameView {
+// A received frame, owning its bytes.
+struct Frame {
     FrameHeader header;
-    const uint8_t* data;
-    const uint8_t* table;
+    std::vector<uint8_t> data;
+    std::vector<uint8_t> table;
 };
 
-// Reads whole frames from a stream socket, buffering so that a small frame costs one read.
-class FrameReader {
-  public:
-    enum class Result { kFrame, kClosed, kMalformed };
+enum class ReadResult { kFrame, kNoData, kClosed, kMalformed };
 
-    explicit FrameReader(int fd) : fd_(fd) {}
-    Result Read(FrameView* frame);
+// Reads exactly one frame from a non-blocking stream socket, so the next frame stays in the
+// socket for whichever thread reads next. With `wait` false, returns kNoData at once when
+// nothing has arrived; a frame that stops arriving half-way counts as malformed.
+ReadResult ReadFrame(int fd, bool wait, Frame* frame);
 
-  private:
-    // False on end of stream or error.
-    bool Fill(size_t needed);
-
-    const int fd_;
-    std::vector<uint8_t> buffer_;
-    size_t begin_ = 0;
-    size_t end_ = 0;
-};
-
-// Sends one frame whole; false when the peer is gone. Callers serialise sends per socket.
+// Sends one frame whole; false when the peer is gone or stopped reading. Callers serialise
+// sends per socket.
 bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
                const std::vector<uint8_t>& table);
 

@@ -68,24 +68,27 @@ uint64_t LocalBinder::ExportId() {
     return id;
 }
 
-void LocalBinder::RunOneway(std::function<void()> call) {
-    {
-        std::lock_guard<std::mutex> lock(oneway_mutex_);
-        if (oneway_running_) {
-            oneway_queue_.push_back(std::move(call));
-            return;
-        }
-        oneway_running_ = true;
-    }
+bool LocalBinder::QueueOneway(std::function<void()> call) {
+    std::lock_guard<std::mutex> lock(oneway_mutex_);
+    oneway_queue_.push_back(std::move(call));
+    if (oneway_running_) return false;
+    oneway_running_ = true;
+    return true;
+}
+
+void LocalBinder::DrainOneway() {
     for (;;) {
-        call();
-        std::lock_guard<std::mutex> lock(oneway_mutex_);
-        if (oneway_queue_.empty()) {
-            oneway_running_ = false;
-            return;
+        std::function<void()> call;
+        {
+            std::lock_guard<std::mutex> lock(oneway_mutex_);
+            if (oneway_queue_.empty()) {
+                oneway_running_ = false;
+                return;
+            }
+            call = std::move(oneway_queue_.front());
+            oneway_queue_.pop_front();
         }
-        call = std::move(oneway_queue_.front());
-        oneway_queue_.pop_front();
+        call();
     }
 }
 

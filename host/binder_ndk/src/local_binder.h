@@ -33,8 +33,10 @@ class LocalBinder : public AIBinder {
     // The process-wide id under which other processes refer to this binder.
     uint64_t ExportId();
 
-    // Oneway calls to one binder run one after another, in arrival order.
-    void RunOneway(std::function<void()> call);
+    // Oneway calls to one binder run one after another, in arrival order: calls are queued in
+    // stream order, and a true result means the caller must now DrainOneway.
+    bool QueueOneway(std::function<void()> call);
+    void DrainOneway();
 
   private:
     ~LocalBinder() override;

@@ -111,7 +111,6 @@ ndk::SpAIBinder ProcessState::Lookup(const std::string& name) {
 
 std::shared_ptr<Connection> ProcessState::ConnectTo(const std::string& dir,
                                                     const std::string& peer_key) {
-    JoinRetired();
     {
         std::lock_guard<std::mutex> lock(mutex_);
         if (shutting_down_) return nullptr;
@@ -141,13 +140,13 @@ std::shared_ptr<Connection> ProcessState::ConnectTo(const std::string& dir,
         auto it = by_key_.find(peer_key);
         if (it != by_key_.end()) {
             std::shared_ptr<Connection> existing = it->second.lock();
-            // Another thread connected meanwhile; ours was never started and just closes.
+            // Another thread connected meanwhile; ours was never used and just closes.
             if (existing != nullptr && !existing->dead()) return existing;
         }
         by_key_[peer_key] = connection;
-        connections_.insert(connection);
     }
     connection->Start(own_key);
+    looper_.Add(connection);
     return connection;
 }
 
@@ -156,78 +155,45 @@ void ProcessState::Adopt(const std::shared_ptr<Connection>& connection) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
         if (shutting_down_) return;
-        connections_.insert(connection);
     }
     connection->Start(own_key);
-    JoinRetired();
+    looper_.Add(connection);
 }
 
 void ProcessState::NamePeer(const std::shared_ptr<Connection>& connection,
                             const std::string& peer_key) {
     std::lock_guard<std::mutex> lock(mutex_);
-    auto it = by_key_.find(peer_key);
-    if (it != by_key_.end()) {
-        std::shared_ptr<Connection> existing = it->second.lock();
-        if (existing != nullptr && !existing->dead()) return;
-    }
-    by_key_[peer_key] = connection;
-}
-
-void ProcessState::Retire(const std::shared_ptr<Connection>& connection, std::thread reader) {
-    std::lock_guard<std::mutex> lock(mutex_);
-    connections_.erase(connection);
     for (auto it = by_key_.begin(); it != by_key_.end();) {
         std::shared_ptr<Connection> named = it->second.lock();
-        if (named == nullptr || named == connection) {
+        if (named == nullptr || named->dead()) {
             it = by_key_.erase(it);
         } else {
             ++it;
         }
     }
-    if (reader.joinable()) retired_.push_back(std::move(reader));
-    retired_cv_.notify_all();
-}
-
-void ProcessState::JoinRetired() {
-    std::vector<std::thread> joinable;
-    {
-        std::lock_guard<std::mutex> lock(mutex_);
-        for (auto it = retired_.begin(); it != retired_.end();) {
-            if (it->get_id() == std::this_thread::get_id()) {
-                ++it;
-                continue;
-            }
-            joinable.push_back(std::move(*it));
-            it = retired_.erase(it);
-        }
-    }
-    for (std::thread& thread : joinable) thread.join();
+    if (by_key_.count(peer_key) == 0) by_key_[peer_key] = connection;
 }
 
 void ProcessState::Shutdown() {
     std::map<std::string, std::unique_ptr<Listener>> listeners;
     std::vector<std::pair<std::string, std::string>> published;
-    std::set<std::shared_ptr<Connection>> connections;
     std::string own_key;
     {
         std::lock_guard<std::mutex> lock(mutex_);
         shutting_down_ = true;
         listeners.swap(listeners_);
         published.swap(published_);
-        connections = connections_;
         own_key = key_;
     }
     for (const auto& entry : published) Registry::Unpublish(entry.first, entry.second, own_key);
     for (auto& entry : listeners) entry.second->Stop();
     listeners.clear();
-    for (const std::shared_ptr<Connection>& connection : connections) connection->Close();
-    connections.clear();
-    {
-        std::unique_lock<std::mutex> lock(mutex_);
-        retired_cv_.wait(lock, [this] { return connections_.empty(); });
+    // Closed connections end through the looper, which delivers their death notices.
+    for (const std::shared_ptr<Connection>& connection : looper_.Connections()) {
+        connection->Close();
     }
-    JoinRetired();
-    pool_.Shutdown();
+    looper_.WaitForNoConnections();
+    looper_.Shutdown();
     std::map<std::string, ndk::SpAIBinder> services;
     {
         std::lock_guard<std::mutex> lock(services_mutex_);
@@ -235,6 +201,7 @@ void ProcessState::Shutdown() {
     }
     services.clear();
     std::lock_guard<std::mutex> lock(mutex_);
+    by_key_.clear();
     key_.clear();
     shutting_down_ = false;
 }

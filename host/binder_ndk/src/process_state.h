@@ -3,17 +3,14 @@
 #include <android/binder_auto_utils.h>
 #include <android/binder_status.h>
 
-#include <condition_variable>
 #include <map>
 #include <memory>
 #include <mutex>
-#include <set>
 #include <string>
-#include <thread>
 #include <utility>
 #include <vector>
 
-#include "thread_pool.h"
+#include "looper.h"
 
 namespace vyr_binder {
 
@@ -26,7 +23,7 @@ class ProcessState {
   public:
     static ProcessState& Get();
 
-    ThreadPool& pool() { return pool_; }
+    Looper& looper() { return looper_; }
     // Names this process to its peers: "p<pid>-<random>".
     std::string key();
 
@@ -39,30 +36,23 @@ class ProcessState {
     void Adopt(const std::shared_ptr<Connection>& connection);
     // Records the key a peer introduced itself with, so lookups reuse its connection.
     void NamePeer(const std::shared_ptr<Connection>& connection, const std::string& key);
-    // Called by a connection's reader thread as its last act.
-    void Retire(const std::shared_ptr<Connection>& connection, std::thread reader);
-
     void Shutdown();
 
   private:
     ProcessState() = default;
     std::shared_ptr<Connection> ConnectTo(const std::string& dir, const std::string& key);
     bool EnsureListenerLocked(const std::string& dir);
-    void JoinRetired();
     static void RemoveFilesAtExit();
 
-    ThreadPool pool_;
+    Looper looper_;
 
     std::mutex services_mutex_;
     std::map<std::string, ndk::SpAIBinder> services_;
 
     std::mutex mutex_;
-    std::condition_variable retired_cv_;
     std::string key_;
     bool shutting_down_ = false;
-    std::set<std::shared_ptr<Connection>> connections_;
     std::map<std::string, std::weak_ptr<Connection>> by_key_;
-    std::vector<std::thread> retired_;
     std::map<std::string, std::unique_ptr<Listener>> listeners_;  // by registry directory
     std::vector<std::pair<std::string, std::string>> published_;  // (directory, name)
 };

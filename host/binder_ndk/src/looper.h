@@ -1,0 +1,87 @@
+#pragma once
+
+#include <condition_variable>
+#include <cstdint>
+#include <deque>
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+namespace vyr_binder {
+
+class Connection;
+
+// The process's binder threads and the epoll set of its connections.
+//
+// Every runtime thread waits in the same epoll set; the one woken for a connection reads one
+// frame, lets the next reader in, and then serves a call in that frame itself, so a call costs
+// no hand-over between threads. The looper thread exists from the first connection on; until
+// the pool is started (or a thread joins it) it handles replies, reference counts and deaths
+// but leaves incoming calls queued, as a device process without a thread pool would.
+class Looper {
+  public:
+    static constexpr uint32_t kDefaultMaxThreads = 15;
+
+    Looper();
+    Looper(const Looper&) = delete;
+    Looper& operator=(const Looper&) = delete;
+
+    void StartPool();
+    bool IsStarted() const;
+    bool SetMaxThreads(uint32_t max_threads);
+    // Serves until Shutdown.
+    void Join();
+    // Runs `work` on a pool thread, once there is one.
+    void Enqueue(std::function<void()> work);
+    // Called by a pool thread about to serve a call itself: keeps a thread free for reading.
+    void BeforeServingInline();
+    // Runs `task` on a runtime thread now, pool or not (death notices).
+    void RunTask(std::function<void()> task);
+
+    void Add(const std::shared_ptr<Connection>& connection);
+    void Remove(const Connection& connection);
+    // Lets one waiting thread read the connection when data arrives; Disarm stops that.
+    void Arm(const Connection& connection);
+    void Disarm(const Connection& connection);
+    std::vector<std::shared_ptr<Connection>> Connections();
+    void WaitForNoConnections();
+
+    // Stops and joins every thread; queued work is dropped. Everything works again after.
+    void Shutdown();
+
+    // True on the looper, pool and joined threads.
+    static bool OnRuntimeThread();
+
+  private:
+    enum class Kind { kLooper, kPool, kJoined };
+
+    void Run(Kind kind);
+    void SpawnLocked(Kind kind);
+    void ArmWorkLocked();
+    bool HaveExecutorsLocked() const { return started_ || joined_ > 0; }
+    void Control(int op, int fd, uint32_t events, uint64_t tag);
+
+    const int epoll_fd_;
+    const int work_fd_;  // always readable; armed one-shot while work is queued
+    const int stop_fd_;  // readable while stopping, waking every thread
+
+    mutable std::mutex mutex_;
+    std::condition_variable cv_;
+    std::deque<std::function<void()>> queue_;
+    std::vector<std::thread> threads_;
+    std::vector<std::pair<std::thread, std::shared_ptr<bool>>> tasks_;
+    std::map<uint64_t, std::shared_ptr<Connection>> connections_;
+    uint64_t next_serial_ = 1;
+    uint32_t max_threads_ = kDefaultMaxThreads;
+    uint32_t spawned_ = 0;
+    uint32_t idle_executors_ = 0;
+    uint32_t joined_ = 0;
+    bool looper_running_ = false;
+    bool started_ = false;
+    bool stopping_ = false;
+};
+
+}  // namespace vyr_binder
