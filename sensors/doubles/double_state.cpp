@@ -32,8 +32,8 @@ int DoubleState::OnCall(const char* name, std::vector<int64_t> args,
             const uint64_t generation = hold.generation;
             ++hold.blocked;
             changed_.notify_all();
-            changed_.wait(lock, [&] { return !hold.held || hold.generation != generation; });
-            --hold.blocked;
+            // Every release bumps the generation and forgets the calls it freed.
+            changed_.wait(lock, [&] { return hold.generation != generation; });
         }
         auto d = delays_.find(name);
         if (d != delays_.end()) delay = d->second;
@@ -77,6 +77,7 @@ void DoubleState::SetAlsInstance(AmbientLightSensor* instance) {
 
 void DoubleState::ReleaseLocked(HoldState& hold) {
     hold.held = false;
+    hold.blocked = 0;
     ++hold.generation;
 }
 

@@ -54,6 +54,7 @@ class DoubleState {
         // Bumped by every release so a blocked call cannot miss one that is followed at once by
         // a new Hold.
         uint64_t generation = 0;
+        // Calls blocked by the current hold; calls already released no longer count.
         size_t blocked = 0;
     };
 

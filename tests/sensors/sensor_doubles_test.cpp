@@ -298,6 +298,8 @@ TEST_F(SensorDoublesTest, ReleaseThenHoldAgainStillFreesTheFirstCall) {
     ASSERT_TRUE(sd::WaitUntilHeld(sd::kAlsDisable, 5s));
     sd::Release(sd::kAlsDisable);
     sd::Hold(sd::kAlsDisable);
+    // The released call does not count as held by the new hold.
+    EXPECT_FALSE(sd::WaitUntilHeld(sd::kAlsDisable, 10ms));
     first.join();
     std::thread second([&] { als->Disable(); });
     ASSERT_TRUE(sd::WaitUntilHeld(sd::kAlsDisable, 5s));
