@@ -3,6 +3,7 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <ftw.h>
+#include <gtest/gtest.h>
 #include <limits.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -80,6 +81,12 @@ SandboxedService::~SandboxedService() {
         sandbox_->CloseStdin();
         if (!sandbox_->Wait(kStopTimeout)) sandbox_->Signal(SIGKILL);
         sandbox_.reset();
+        // Sanitized builds of the service report into its log and may go on running.
+        for (const char* report : {"Sanitizer", "runtime error:"}) {
+            std::ifstream log(dir_ + "/service.log");
+            const std::string text{std::istreambuf_iterator<char>(log), {}};
+            EXPECT_EQ(std::string::npos, text.find(report)) << text;
+        }
     }
     if (!dir_.empty() && getenv("VYR_E2E_KEEP") == nullptr) {
         nftw(dir_.c_str(), RemoveEntry, 16, FTW_DEPTH | FTW_PHYS);

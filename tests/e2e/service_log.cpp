@@ -1,20 +1,49 @@
 #include "service_log.h"
 
 #include <fstream>
-#include <regex>
 
 namespace vyr_e2e {
 
+namespace {
+
+bool AllOf(const std::string& text, const char* allowed) {
+    return !text.empty() && text.find_first_not_of(allowed) == std::string::npos;
+}
+
+// Splits "<tag> <P> <MM-DD> <hh:mm:ss[.fff]> <pid> <tid> <message>" (numbers may be padded with
+// blanks); false for a line that does not start a record.
+bool ParseHeader(const std::string& line, LogLine* record) {
+    std::string fields[6];
+    size_t at = 0;
+    for (std::string& field : fields) {
+        at = line.find_first_not_of(' ', at);
+        if (at == std::string::npos) return false;
+        const size_t end = line.find(' ', at);
+        if (end == std::string::npos) return false;
+        field = line.substr(at, end - at);
+        at = end;
+    }
+    if (fields[1].size() != 1 || std::string("VDIWEF").find(fields[1][0]) == std::string::npos ||
+        !AllOf(fields[2], "0123456789-") || !AllOf(fields[3], "0123456789:.") ||
+        !AllOf(fields[4], "0123456789") || !AllOf(fields[5], "0123456789")) {
+        return false;
+    }
+    record->tag = fields[0];
+    record->priority = fields[1][0];
+    record->message = line.substr(at + 1);
+    return true;
+}
+
+}  // namespace
+
 std::vector<LogLine> ReadServiceLog(const std::string& path) {
-    static const std::regex kHeader(
-        R"(^(\S+) ([VDIWEF]) \d\d-\d\d \d\d:\d\d:\d\d(\.\d+)? +\d+ +\d+ (.*)$)");
     std::vector<LogLine> records;
     std::ifstream in(path);
     std::string line;
     while (std::getline(in, line)) {
-        std::smatch match;
-        if (std::regex_match(line, match, kHeader)) {
-            records.push_back({match[1], match[2].str()[0], match[4]});
+        LogLine record;
+        if (ParseHeader(line, &record)) {
+            records.push_back(record);
         } else if (!records.empty()) {
             records.back().message += "\n" + line;
         }
