@@ -8,14 +8,13 @@
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <benchmark/benchmark.h>
-#include <vyr/binder_host.h>
-
 #include <signal.h>
 #include <spawn.h>
 #include <stdlib.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <vyr/binder_host.h>
 
 #include <chrono>
 #include <condition_variable>
@@ -126,7 +125,7 @@ void BM_RawSocketPingPong(benchmark::State& state) {
 void BM_BinderRoundTrip(benchmark::State& state) {
     pid_t pid = SpawnSelf({"--serve", "bench.roundtrip"});
     std::shared_ptr<IVYRService> service =
-            IVYRService::fromBinder(WaitForService("bench.roundtrip"));
+        IVYRService::fromBinder(WaitForService("bench.roundtrip"));
     if (service == nullptr) {
         state.SkipWithError("service did not start");
         Reap(pid);
@@ -195,7 +194,7 @@ class RatioReporter : public benchmark::ConsoleReporter {
         for (const Run& run : runs) {
             if (run.iterations > 0) {
                 times_[run.benchmark_name()] =
-                        run.GetAdjustedRealTime() * 1.0;  // in the benchmark's unit
+                    run.GetAdjustedRealTime() * 1.0;  // in the benchmark's unit
             }
         }
         ConsoleReporter::ReportRuns(runs);

@@ -2,9 +2,9 @@
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <signal.h>
 #include <spawn.h>
-#include <poll.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <sys/wait.h>
@@ -13,8 +13,8 @@
 
 #include <atomic>
 #include <chrono>
-#include <cstring>
 #include <condition_variable>
+#include <cstring>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -22,8 +22,8 @@
 
 #include "binder_test_env.h"
 #include "echo_binder.h"
-#include "test_service.h"
 #include "frame_io.h"
+#include "test_service.h"
 #include "wire.h"
 
 extern char** environ;

@@ -1,18 +1,17 @@
 #include "connection.h"
 
+#include <android/binder_parcel_utils.h>
+#include <sys/socket.h>
+#include <unistd.h>
+
+#include <utility>
+
 #include "call_context.h"
 #include "frame_io.h"
 #include "local_binder.h"
 #include "looper.h"
 #include "process_state.h"
 #include "proxy_binder.h"
-
-#include <android/binder_parcel_utils.h>
-#include <fcntl.h>
-#include <sys/socket.h>
-#include <unistd.h>
-
-#include <utility>
 
 namespace vyr_binder {
 namespace {
@@ -29,7 +28,6 @@ Looper& TheLooper() {
 }  // namespace
 
 Connection::Connection(int fd) : fd_(fd) {
-    fcntl(fd_, F_SETFL, fcntl(fd_, F_GETFL) | O_NONBLOCK);
     ucred cred{};
     socklen_t len = sizeof(cred);
     if (getsockopt(fd_, SOL_SOCKET, SO_PEERCRED, &cred, &len) == 0) {
@@ -114,8 +112,7 @@ bool Connection::HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call) {
 
 bool Connection::DecodeParcel(Frame& frame, AParcel* parcel) {
     std::vector<WireObject> objects;
-    if (!DecodeObjects(frame.table.data(), frame.table.size(), frame.header.object_count,
-                       &objects)) {
+    if (!DecodeObjects(frame.table.data(), frame.table.size(), frame.header.object_count, &objects)) {
         return false;
     }
     parcel->data = std::move(frame.data);
@@ -189,8 +186,7 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
                                                 std::vector<WireObject>* objects) {
     for (const ParcelObject& object : parcel.objects) {
         AIBinder* binder = object.binder.get();
-        if (binder->IsRemote() &&
-            static_cast<ProxyBinder*>(binder)->connection().get() != this) {
+        if (binder->IsRemote() && static_cast<ProxyBinder*>(binder)->connection().get() != this) {
             // Handing a third process's object on is not supported.
             return STATUS_INVALID_OPERATION;
         }
@@ -199,8 +195,8 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
     for (const ParcelObject& object : parcel.objects) {
         AIBinder* binder = object.binder.get();
         if (binder->IsRemote()) {
-            objects->push_back(WireObject{ObjectKind::kReceiverObject,
-                                          static_cast<ProxyBinder*>(binder)->remote_id(), {}});
+            objects->push_back(WireObject{
+                ObjectKind::kReceiverObject, static_cast<ProxyBinder*>(binder)->remote_id(), {}});
             continue;
         }
         LocalBinder* local = static_cast<LocalBinder*>(binder);
@@ -213,8 +209,8 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
     return STATUS_OK;
 }
 
-bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id,
-                      uint64_t target, uint64_t parent, const AParcel* parcel,
+bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
+                      uint64_t parent, const AParcel* parcel,
                       const std::vector<WireObject>& objects) {
     std::vector<uint8_t> table;
     if (!objects.empty()) EncodeObjects(objects, &table);
@@ -384,7 +380,7 @@ void Connection::Dispatch(std::shared_ptr<Incoming> call, bool can_serve) {
             static_cast<LocalBinder*>(target.get())->DrainOneway();
         } else {
             TheLooper().Enqueue(
-                    [target] { static_cast<LocalBinder*>(target.get())->DrainOneway(); });
+                [target] { static_cast<LocalBinder*>(target.get())->DrainOneway(); });
         }
         return;
     }
@@ -402,7 +398,7 @@ void Connection::Serve(Incoming& call) {
     AParcel reply;
     call.data->pos = 0;
     binder_status_t status =
-            call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
+        call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
     if ((call.flags & FLAG_ONEWAY) == 0) SendReply(call.id, status, reply);
 }
 

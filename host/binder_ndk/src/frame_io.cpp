@@ -15,7 +15,23 @@ constexpr int kStallMillis = 10000;
 
 enum class Chunk { kDone, kNoData, kClosed, kStalled };
 
-// Reads `size` bytes. Before the first byte it waits for ever (wait) or not at all.
+// Reads `size` bytes, blocking until all are there: a caller waiting for its reply has nothing
+// better to do.
+Chunk ReadBlocking(int fd, uint8_t* buffer, size_t size) {
+    size_t done = 0;
+    while (done < size) {
+        ssize_t n = recv(fd, buffer + done, size - done, MSG_WAITALL);
+        if (n > 0) {
+            done += static_cast<size_t>(n);
+        } else if (n == 0 || errno != EINTR) {
+            return Chunk::kClosed;
+        }
+    }
+    return Chunk::kDone;
+}
+
+// Reads `size` bytes. Before the first byte it waits for ever (wait) or not at all; after it,
+// a stalled peer ends the read.
 Chunk ReadExact(int fd, uint8_t* buffer, size_t size, bool wait_for_first) {
     size_t done = 0;
     while (done < size) {
@@ -40,7 +56,8 @@ Chunk ReadExact(int fd, uint8_t* buffer, size_t size, bool wait_for_first) {
 
 ReadResult ReadFrame(int fd, bool wait, Frame* frame) {
     uint8_t* header = reinterpret_cast<uint8_t*>(&frame->header);
-    Chunk chunk = ReadExact(fd, header, sizeof(FrameHeader), wait);
+    Chunk chunk = wait ? ReadBlocking(fd, header, sizeof(FrameHeader))
+                       : ReadExact(fd, header, sizeof(FrameHeader), false);
     if (chunk == Chunk::kNoData) return ReadResult::kNoData;
     if (chunk == Chunk::kStalled) return ReadResult::kMalformed;
     if (chunk != Chunk::kDone) return ReadResult::kClosed;
@@ -49,7 +66,8 @@ ReadResult ReadFrame(int fd, bool wait, Frame* frame) {
     frame->table.resize(frame->header.table_size);
     for (std::vector<uint8_t>* part : {&frame->data, &frame->table}) {
         if (part->empty()) continue;
-        chunk = ReadExact(fd, part->data(), part->size(), true);
+        chunk = wait ? ReadBlocking(fd, part->data(), part->size())
+                     : ReadExact(fd, part->data(), part->size(), true);
         if (chunk == Chunk::kStalled) return ReadResult::kMalformed;
         if (chunk != Chunk::kDone) return ReadResult::kClosed;
     }
@@ -59,9 +77,9 @@ ReadResult ReadFrame(int fd, bool wait, Frame* frame) {
 bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
                const std::vector<uint8_t>& table) {
     iovec iov[3] = {
-            {const_cast<FrameHeader*>(&header), sizeof(header)},
-            {const_cast<uint8_t*>(data), header.data_size},
-            {const_cast<uint8_t*>(table.data()), table.size()},
+        {const_cast<FrameHeader*>(&header), sizeof(header)},
+        {const_cast<uint8_t*>(data), header.data_size},
+        {const_cast<uint8_t*>(table.data()), table.size()},
     };
     size_t first = 0;
     while (first < 3) {

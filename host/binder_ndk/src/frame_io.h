@@ -1,9 +1,9 @@
 #pragma once
 
-#include "wire.h"
-
 #include <cstdint>
 #include <vector>
+
+#include "wire.h"
 
 namespace vyr_binder {
 
@@ -16,9 +16,10 @@ struct Frame {
 
 enum class ReadResult { kFrame, kNoData, kClosed, kMalformed };
 
-// Reads exactly one frame from a non-blocking stream socket, so the next frame stays in the
-// socket for whichever thread reads next. With `wait` false, returns kNoData at once when
-// nothing has arrived; a frame that stops arriving half-way counts as malformed.
+// Reads exactly one frame from a stream socket, so the next frame stays in the socket for
+// whichever thread reads next. With `wait`, blocks until a whole frame is there. Without, returns
+// kNoData at once when nothing has arrived, and a frame that stops arriving half-way counts as
+// malformed, so a runtime thread is never held by one peer.
 ReadResult ReadFrame(int fd, bool wait, Frame* frame);
 
 // Sends one frame whole; false when the peer is gone or stopped reading. Callers serialise

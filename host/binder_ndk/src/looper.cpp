@@ -1,13 +1,13 @@
 #include "looper.h"
 
-#include "connection.h"
-
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
 #include <unistd.h>
 
 #include <cstdint>
 #include <utility>
+
+#include "connection.h"
 
 namespace vyr_binder {
 namespace {
