@@ -97,21 +97,42 @@ void DisplayTest::SetUp() {
 
 void DisplayTest::TearDown() {
     if (!HaveOwnUtsNamespace()) return;
-    if (service_ != nullptr && panel_ != "Off") {
+    if (service_ != nullptr) {
         // A test that failed while the panel was lit: stop the display's sampling first, since
         // destruction does not stop processing threads.
-        Panel("Off");
+        if (fuse_ != nullptr) {
+            fuse_->FailReads(0);
+            fuse_->Set("Off");
+        } else if (panel_ != "Off") {
+            Panel("Off");
+        }
         WaitForBlock(kAlsBlock, [](const VYRService::ModeBlockSnapshot& block) {
             return block.enable_count <= 0 && !block.running;
         });
     }
     EXPECT_TRUE(DestroyService());
+    fuse_.reset();
     sensor_doubles::Reset();
     EXPECT_TRUE(WaitForThreadCount(baseline_threads_, 5s))
         << "threads left: " << ThreadCount() << ", expected " << baseline_threads_;
 }
 
-void DisplayTest::MakeService(bool als, bool range) {
+void DisplayTest::MakeServiceOnFuse() {
+    if (!HavePrivateMounts()) {
+        if (UnderCi()) GTEST_FAIL() << "no private mount namespace for a FUSE mount";
+        GTEST_SKIP() << "no private mount namespace for a FUSE mount";
+    }
+    fuse_ = std::make_unique<FuseAttribute>();
+    if (!fuse_->problem().empty()) {
+        const std::string problem = fuse_->problem();
+        fuse_.reset();
+        if (UnderCi()) GTEST_FAIL() << problem;
+        GTEST_SKIP() << problem;
+    }
+    MakeService(true, true, fuse_->path());
+}
+
+void DisplayTest::MakeService(bool als, bool range, const std::string& path) {
     ServiceConfig config;
     config.get_bool_property = [als, range](const char* key, bool default_value) {
         if (std::string(key) == kAlsProperty) return als;
@@ -119,7 +140,7 @@ void DisplayTest::MakeService(bool als, bool range) {
         return default_value;
     };
     config.startup_delay = 0ms;
-    config.display_state_path = kStatePath;
+    config.display_state_path = path;
     service_ = ndk::SharedRefBase::make<VYRService>(config);
 }
 
@@ -194,7 +215,11 @@ bool DisplayTest::NotifyUntil(const std::function<bool()>& done, std::chrono::mi
     const auto deadline = std::chrono::steady_clock::now() + timeout;
     while (!done()) {
         if (std::chrono::steady_clock::now() >= deadline) return false;
-        Panel(panel_);
+        if (fuse_ != nullptr) {
+            fuse_->Notify();
+        } else {
+            Panel(panel_);
+        }
         std::this_thread::sleep_for(20ms);
     }
     return true;

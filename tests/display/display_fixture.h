@@ -11,6 +11,7 @@
 #include <memory>
 #include <string>
 
+#include "fuse_attribute.h"
 #include "log_capture.h"
 #include "sensor_doubles.h"
 #include "vyrservice.h"
@@ -42,7 +43,11 @@ class DisplayTest : public ::testing::Test {
     void TearDown() override;
 
     // Both properties as given; the service is built with the panel dark ("Off").
-    void MakeService(bool als = true, bool range = true);
+    void MakeService(bool als = true, bool range = true, const std::string& path = kStatePath);
+    // Builds the service with both sensors, watching a FUSE attribute (fuse_) whose content and
+    // read errors the test chooses. Skips (fails under CI=true) where FUSE is unavailable; fuse_
+    // stays null then, and the test must return.
+    void MakeServiceOnFuse();
     // Destroys the service on another thread, waking the display monitor (which blocks in poll()
     // without a time-out) until the destruction has finished. False if it did not within kWait.
     bool DestroyService();
@@ -67,8 +72,8 @@ class DisplayTest : public ::testing::Test {
                       const std::function<bool(const VYRService::ModeBlockSnapshot&)>& condition);
     // Starts destroying the service on another thread.
     std::future<void> StartDestruction();
-    // Sets the panel state again every 20 ms (waking the display monitor without changing what
-    // it reads) until `done` is true; false on time-out.
+    // Notifies the display monitor's attribute again every 20 ms (waking the monitor without
+    // changing what it reads) until `done` is true; false on time-out.
     bool NotifyUntil(const std::function<bool()>& done, std::chrono::milliseconds timeout);
     // Records of the worker's "EnableWork"/"DisableWork" line for `handle`.
     size_t WorkLines(const std::string& work, int32_t handle);
@@ -84,6 +89,7 @@ class DisplayTest : public ::testing::Test {
     std::shared_ptr<VYRService> service_;
     size_t baseline_threads_ = 0;
     std::string panel_ = "Off";
+    std::unique_ptr<FuseAttribute> fuse_;
 };
 
 }  // namespace vyr_display_test

@@ -8,5 +8,7 @@ namespace vyr_display_test {
 // and if not, why.
 bool HaveOwnUtsNamespace();
 const std::string& UtsNamespaceProblem();
+// Whether mounts made by this process are its own (a private mount namespace).
+bool HavePrivateMounts();
 
 }  // namespace vyr_display_test

@@ -1,9 +1,11 @@
 // The hostname is per UTS namespace and unshare() moves only the calling thread; doing it first
 // thing in main(), before gtest or the binder runtime start a thread, puts the whole test process
-// in the namespace, so that sethostname() never touches the machine's own name.
+// in the namespace, so that sethostname() never touches the machine's own name. A mount namespace
+// of its own likewise keeps the test's FUSE mounts private.
 
 #include <gtest/gtest.h>
 #include <sched.h>
+#include <sys/mount.h>
 
 #include <cerrno>
 #include <cstring>
@@ -14,6 +16,7 @@ namespace vyr_display_test {
 namespace {
 
 bool g_have_namespace = false;
+bool g_private_mounts = false;
 std::string g_problem;
 
 }  // namespace
@@ -26,14 +29,21 @@ const std::string& UtsNamespaceProblem() {
     return g_problem;
 }
 
+bool HavePrivateMounts() {
+    return g_private_mounts;
+}
+
 }  // namespace vyr_display_test
 
 int main(int argc, char** argv) {
-    if (unshare(CLONE_NEWUTS) == 0) {
+    if (unshare(CLONE_NEWUTS | CLONE_NEWNS) == 0) {
         vyr_display_test::g_have_namespace = true;
+        // File systems that tests mount stay invisible to the machine and die with the process.
+        vyr_display_test::g_private_mounts =
+            mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
     } else {
         vyr_display_test::g_problem =
-            std::string("cannot create a UTS namespace (needs root / CAP_SYS_ADMIN): ") +
+            std::string("cannot create UTS and mount namespaces (needs root / CAP_SYS_ADMIN): ") +
             strerror(errno);
     }
     testing::InitGoogleTest(&argc, argv);
