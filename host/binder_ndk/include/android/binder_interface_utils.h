@@ -35,8 +35,9 @@ class SharedRefBase {
     std::shared_ptr<const T> ref() const {
         std::shared_ptr<const SharedRefBase> thiz = mThis.lock();
         std::call_once(mFlagThis, [&]() {
-            SharedRefBase* self = const_cast<SharedRefBase*>(this);
-            mThis = thiz = std::shared_ptr<SharedRefBase>(self);
+            std::shared_ptr<SharedRefBase> owner(const_cast<SharedRefBase*>(this));
+            mThis = owner;
+            thiz = owner;
         });
         return std::static_pointer_cast<const T>(thiz);
     }
