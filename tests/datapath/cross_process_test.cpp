@@ -3,12 +3,16 @@
 
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 
+#include <algorithm>
 #include <chrono>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
 #include <map>
 #include <memory>
-#include <regex>
 #include <set>
 #include <thread>
 #include <vector>
@@ -29,20 +33,21 @@ constexpr int32_t kRange = 3;
 constexpr milliseconds kRegistration{30000};
 constexpr milliseconds kWait{10000};
 
+// The number after "key": in one line of vyrctl's JSON output.
 int64_t JsonInt(const std::string& json, const std::string& key) {
-    std::smatch match;
-    std::regex pattern("\"" + key + "\":(-?[0-9]+)");
-    if (!std::regex_search(json, match, pattern)) return INT64_MIN;
-    return std::stoll(match[1]);
+    size_t at = json.find("\"" + key + "\":");
+    if (at == std::string::npos) return INT64_MIN;
+    return strtoll(json.c_str() + at + key.size() + 3, nullptr, 10);
 }
 
+// The number of elements of the array after "key":.
 size_t JsonArrayLength(const std::string& json, const std::string& key) {
-    std::smatch match;
-    std::regex pattern("\"" + key + "\":\\[([^\\]]*)\\]");
-    if (!std::regex_search(json, match, pattern)) return 0;
-    std::string items = match[1];
-    if (items.empty()) return 0;
-    return static_cast<size_t>(std::count(items.begin(), items.end(), ',')) + 1;
+    size_t at = json.find("\"" + key + "\":[");
+    if (at == std::string::npos) return 0;
+    size_t begin = at + key.size() + 4;
+    size_t end = json.find(']', begin);
+    if (end == std::string::npos || end == begin) return 0;
+    return static_cast<size_t>(std::count(json.begin() + begin, json.begin() + end, ',')) + 1;
 }
 
 bool ExitedWith(const std::optional<int>& status, int code) {
@@ -274,6 +279,38 @@ TEST_F(CrossProcessTest, DeathOfAClosedClientChangesNothing) {
     service_->Disable(survivor);
     service_->Close(survivor);
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+TEST_F(CrossProcessTest, ConfigureAndTorchReachTheSensors) {
+    auto configure = Vyrctl({"configure", "10", "0", "0", "0", "1", "0", "0", "0", "0", "0", "0"});
+    EXPECT_EQ(configure->ReadLine(kWait), "configure -> 0");
+    EXPECT_TRUE(ExitedWith(configure->Wait(kWait), 0));
+    EXPECT_TRUE(process_->WaitForSensorState("range.frame_rate_hz", "10", kWait));
+
+    auto torch = Vyrctl({"torch", "257"});
+    EXPECT_EQ(torch->ReadLine(kWait), "torch 257 -> ok");
+    EXPECT_TRUE(ExitedWith(torch->Wait(kWait), 0));
+    EXPECT_TRUE(process_->WaitForSensorState("torch", "1", kWait));
+    EXPECT_TRUE(process_->WaitForLog("torch state changed to 257", kWait));
+
+    auto restore = Vyrctl({"configure", "30", "0", "0", "0", "0", "0", "0", "0", "0", "0", "0"});
+    EXPECT_TRUE(ExitedWith(restore->Wait(kWait), 0));
+    auto dark = Vyrctl({"torch", "0"});
+    EXPECT_TRUE(ExitedWith(dark->Wait(kWait), 0));
+    EXPECT_TRUE(process_->WaitForSensorState("torch", "0", kWait));
+}
+
+TEST_F(CrossProcessTest, ClientGivesUpClearlyWithoutAService) {
+    std::string empty_registry = process_->dir() + "/empty-registry";
+    ASSERT_EQ(mkdir(empty_registry.c_str(), 0700), 0);
+    std::string stderr_path = process_->dir() + "/vyrctl-no-service.log";
+    ChildProcess torch({VYRCTL_PATH, "--timeout", "0.5", "torch", "1"},
+                       {{"VYR_BINDER_DIR", empty_registry}}, stderr_path);
+    EXPECT_TRUE(ExitedWith(torch.Wait(kWait), 1));
+    std::ifstream in(stderr_path);
+    std::string text((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+    EXPECT_NE(text.find("waiting for vyrservice..."), std::string::npos) << text;
+    EXPECT_NE(text.find("error: service \"vyrservice\" not found after"), std::string::npos) << text;
 }
 
 }  // namespace
