@@ -199,9 +199,11 @@ class RatioReporter : public benchmark::ConsoleReporter {
         }
         ConsoleReporter::ReportRuns(runs);
     }
+    // Uses the medians when the benchmarks were repeated.
     void PrintRatio() const {
-        auto raw = times_.find("BM_RawSocketPingPong");
-        auto binder = times_.find("BM_BinderRoundTrip");
+        const char* suffix = times_.count("BM_RawSocketPingPong_median") != 0 ? "_median" : "";
+        auto raw = times_.find(std::string("BM_RawSocketPingPong") + suffix);
+        auto binder = times_.find(std::string("BM_BinderRoundTrip") + suffix);
         if (raw == times_.end() || binder == times_.end() || raw->second <= 0) return;
         printf("binder round trip / raw socket ping-pong = %.2f (%.1f us / %.1f us)\n",
                binder->second / raw->second, binder->second, raw->second);

@@ -591,10 +591,13 @@ TEST_F(MalformedFrameTest, CallToUnknownObjectIsAnsweredDeadObject) {
     header.code = FIRST_CALL_TRANSACTION;
     SendBytes(fd, &header, sizeof(header));
     // The helper's HELLO, then the reply.
+    vyr_binder::FrameBuffer buffer;
     vyr_binder::Frame frame;
-    ASSERT_EQ(vyr_binder::ReadResult::kFrame, vyr_binder::ReadFrame(fd, true, &frame));
+    ASSERT_EQ(vyr_binder::FrameBuffer::Result::kFrame, buffer.Fill(fd, true));
+    buffer.Take(&frame);
     EXPECT_EQ(static_cast<uint32_t>(vyr_binder::FrameType::kHello), frame.header.type);
-    ASSERT_EQ(vyr_binder::ReadResult::kFrame, vyr_binder::ReadFrame(fd, true, &frame));
+    ASSERT_EQ(vyr_binder::FrameBuffer::Result::kFrame, buffer.Fill(fd, true));
+    buffer.Take(&frame);
     EXPECT_EQ(static_cast<uint32_t>(vyr_binder::FrameType::kReply), frame.header.type);
     EXPECT_EQ(static_cast<uint32_t>(STATUS_DEAD_OBJECT), frame.header.code);
     close(fd);

@@ -72,17 +72,24 @@ void Connection::OnReadable(bool can_serve) {
 }
 
 bool Connection::ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call) {
-    Frame frame;
-    switch (ReadFrame(fd_, wait, &frame)) {
-        case ReadResult::kNoData:
-            return true;
-        case ReadResult::kFrame:
-            return HandleFrame(frame, call);
-        case ReadResult::kClosed:
-        case ReadResult::kMalformed:
-            return false;
+    FrameBuffer::Result result = buffer_.Fill(fd_, wait);
+    if (result == FrameBuffer::Result::kNoData) return true;
+    while (result == FrameBuffer::Result::kFrame) {
+        Frame frame;
+        buffer_.Take(&frame);
+        std::shared_ptr<Incoming> next;
+        if (!HandleFrame(frame, &next)) return false;
+        if (next != nullptr) {
+            // One call is served by the reader itself; any other that came with it is queued.
+            if (*call == nullptr) {
+                *call = std::move(next);
+            } else {
+                Dispatch(std::move(next), false);
+            }
+        }
+        result = buffer_.Check();
     }
-    return false;
+    return result == FrameBuffer::Result::kNoData;
 }
 
 bool Connection::HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call) {

@@ -14,13 +14,13 @@
 #include <unordered_map>
 #include <vector>
 
+#include "frame_io.h"
 #include "parcel.h"
 #include "wire.h"
 
 namespace vyr_binder {
 
 class ProxyBinder;
-struct Frame;
 
 // One socket to one peer process, used both ways. One thread at a time reads it (it holds the
 // reading role): a caller waiting for its reply reads for itself when nobody else is, otherwise
@@ -114,6 +114,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::unordered_map<uint64_t, ProxyBinder*> proxies_;
     bool hello_seen_ = false;
     bool reading_ = false;  // the reading role is taken
+    FrameBuffer buffer_;    // used by the holder of the reading role only
 };
 
 }  // namespace vyr_binder

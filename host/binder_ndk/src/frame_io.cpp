@@ -10,68 +10,61 @@
 namespace vyr_binder {
 namespace {
 
-// How long the rest of a started frame, or room to send one, may take to come.
-constexpr int kStallMillis = 10000;
+// How long a peer may keep us from sending a frame before the connection counts as broken.
+constexpr int kSendStallMillis = 10000;
+constexpr size_t kReadChunk = 16 * 1024;
 
-enum class Chunk { kDone, kNoData, kClosed, kStalled };
-
-// Reads `size` bytes, blocking until all are there: a caller waiting for its reply has nothing
-// better to do.
-Chunk ReadBlocking(int fd, uint8_t* buffer, size_t size) {
-    size_t done = 0;
-    while (done < size) {
-        ssize_t n = recv(fd, buffer + done, size - done, MSG_WAITALL);
-        if (n > 0) {
-            done += static_cast<size_t>(n);
-        } else if (n == 0 || errno != EINTR) {
-            return Chunk::kClosed;
-        }
-    }
-    return Chunk::kDone;
-}
-
-// Reads `size` bytes. Before the first byte it waits for ever (wait) or not at all; after it,
-// a stalled peer ends the read.
-Chunk ReadExact(int fd, uint8_t* buffer, size_t size, bool wait_for_first) {
-    size_t done = 0;
-    while (done < size) {
-        ssize_t n = recv(fd, buffer + done, size - done, MSG_DONTWAIT);
-        if (n > 0) {
-            done += static_cast<size_t>(n);
-            continue;
-        }
-        if (n == 0) return Chunk::kClosed;
-        if (errno == EINTR) continue;
-        if (errno != EAGAIN && errno != EWOULDBLOCK) return Chunk::kClosed;
-        if (done == 0 && !wait_for_first) return Chunk::kNoData;
-        pollfd p{fd, POLLIN, 0};
-        int ready = poll(&p, 1, done == 0 ? -1 : kStallMillis);
-        if (ready == 0) return Chunk::kStalled;
-        if (ready < 0 && errno != EINTR) return Chunk::kClosed;
-    }
-    return Chunk::kDone;
+size_t FrameSize(const FrameHeader& header) {
+    return sizeof(FrameHeader) + header.data_size + header.table_size;
 }
 
 }  // namespace
 
-ReadResult ReadFrame(int fd, bool wait, Frame* frame) {
-    uint8_t* header = reinterpret_cast<uint8_t*>(&frame->header);
-    Chunk chunk = wait ? ReadBlocking(fd, header, sizeof(FrameHeader))
-                       : ReadExact(fd, header, sizeof(FrameHeader), false);
-    if (chunk == Chunk::kNoData) return ReadResult::kNoData;
-    if (chunk == Chunk::kStalled) return ReadResult::kMalformed;
-    if (chunk != Chunk::kDone) return ReadResult::kClosed;
-    if (!ValidateHeader(frame->header)) return ReadResult::kMalformed;
-    frame->data.resize(frame->header.data_size);
-    frame->table.resize(frame->header.table_size);
-    for (std::vector<uint8_t>* part : {&frame->data, &frame->table}) {
-        if (part->empty()) continue;
-        chunk = wait ? ReadBlocking(fd, part->data(), part->size())
-                     : ReadExact(fd, part->data(), part->size(), true);
-        if (chunk == Chunk::kStalled) return ReadResult::kMalformed;
-        if (chunk != Chunk::kDone) return ReadResult::kClosed;
+FrameBuffer::Result FrameBuffer::Check() const {
+    if (Available() < sizeof(FrameHeader)) return Result::kNoData;
+    FrameHeader header;
+    std::memcpy(&header, buffer_.data() + begin_, sizeof(header));
+    if (!ValidateHeader(header)) return Result::kMalformed;
+    return Available() >= FrameSize(header) ? Result::kFrame : Result::kNoData;
+}
+
+FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
+    for (;;) {
+        Result result = Check();
+        if (result != Result::kNoData) return result;
+        // Room for the whole frame once its header is known (checked, so at most ~2 MiB).
+        size_t needed = kReadChunk;
+        if (Available() >= sizeof(FrameHeader)) {
+            FrameHeader header;
+            std::memcpy(&header, buffer_.data() + begin_, sizeof(header));
+            needed = FrameSize(header) > needed ? FrameSize(header) : needed;
+        }
+        if (begin_ > 0 && buffer_.size() - begin_ < needed) {
+            std::memmove(buffer_.data(), buffer_.data() + begin_, Available());
+            end_ -= begin_;
+            begin_ = 0;
+        }
+        if (buffer_.size() - begin_ < needed) buffer_.resize(begin_ + needed);
+        ssize_t n = recv(fd, buffer_.data() + end_, buffer_.size() - end_, wait ? 0 : MSG_DONTWAIT);
+        if (n > 0) {
+            end_ += static_cast<size_t>(n);
+            continue;
+        }
+        if (n == 0) return Result::kClosed;
+        if (errno == EINTR) continue;
+        if (!wait && (errno == EAGAIN || errno == EWOULDBLOCK)) return Result::kNoData;
+        return Result::kClosed;
     }
-    return ReadResult::kFrame;
+}
+
+void FrameBuffer::Take(Frame* frame) {
+    std::memcpy(&frame->header, buffer_.data() + begin_, sizeof(FrameHeader));
+    const uint8_t* data = buffer_.data() + begin_ + sizeof(FrameHeader);
+    frame->data.assign(data, data + frame->header.data_size);
+    const uint8_t* table = data + frame->header.data_size;
+    frame->table.assign(table, table + frame->header.table_size);
+    begin_ += FrameSize(frame->header);
+    if (begin_ == end_) begin_ = end_ = 0;
 }
 
 bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
@@ -91,7 +84,7 @@ bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
             if (errno == EINTR) continue;
             if (errno != EAGAIN && errno != EWOULDBLOCK) return false;
             pollfd p{fd, POLLOUT, 0};
-            if (poll(&p, 1, kStallMillis) == 0) return false;
+            if (poll(&p, 1, kSendStallMillis) == 0) return false;
             continue;
         }
         size_t sent = static_cast<size_t>(n);

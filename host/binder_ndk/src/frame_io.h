@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <vector>
 
@@ -14,13 +15,27 @@ struct Frame {
     std::vector<uint8_t> table;
 };
 
-enum class ReadResult { kFrame, kNoData, kClosed, kMalformed };
+// The bytes read from one socket and not yet handled. Reads take whatever has arrived, so a
+// small frame costs one read; a frame still arriving simply stays buffered.
+class FrameBuffer {
+  public:
+    enum class Result { kFrame, kNoData, kClosed, kMalformed };
 
-// Reads exactly one frame from a stream socket, so the next frame stays in the socket for
-// whichever thread reads next. With `wait`, blocks until a whole frame is there. Without, returns
-// kNoData at once when nothing has arrived, and a frame that stops arriving half-way counts as
-// malformed, so a runtime thread is never held by one peer.
-ReadResult ReadFrame(int fd, bool wait, Frame* frame);
+    // Reads until a whole frame is buffered: with `wait` blocking as long as it takes, without
+    // it returning kNoData as soon as the socket has nothing more.
+    Result Fill(int fd, bool wait);
+    // Whether a whole frame is already buffered (kFrame), or the next header is bad.
+    Result Check() const;
+    // Moves the buffered frame out; Check must have given kFrame.
+    void Take(Frame* frame);
+
+  private:
+    size_t Available() const { return end_ - begin_; }
+
+    std::vector<uint8_t> buffer_;
+    size_t begin_ = 0;
+    size_t end_ = 0;
+};
 
 // Sends one frame whole; false when the peer is gone or stopped reading. Callers serialise
 // sends per socket.

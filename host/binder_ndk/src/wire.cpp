@@ -23,7 +23,7 @@ bool ValidateHeader(const FrameHeader& header) {
     if (header.data_size > kMaxTransactionBytes || header.object_count > kMaxObjects) return false;
     size_t max_table =
         static_cast<size_t>(header.object_count) * (sizeof(ObjectEntry) + kMaxDescriptorBytes);
-    if (header.table_size > max_table ||
+    if (header.table_size > max_table || header.table_size > kMaxTransactionBytes ||
         header.table_size < header.object_count * sizeof(ObjectEntry)) {
         return false;
     }
