@@ -74,6 +74,8 @@ TEST_F(AttributeContentTest, ContentIsJudgedAsReadWithoutANewline) {
     ASSERT_TRUE(fuse_->WaitForOpens(1, kWait));
     fuse_->Set("On");
     ASSERT_TRUE(WaitForEnableLine("On"));
+    ASSERT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 1); }));
+    const int32_t display = DisplayHandle();
     // Truly empty content (zero bytes read) is dark.
     fuse_->Set("");
     ASSERT_TRUE(WaitForDisableLine(""));
@@ -87,7 +89,9 @@ TEST_F(AttributeContentTest, ContentIsJudgedAsReadWithoutANewline) {
     ASSERT_TRUE(WaitForEnableLine(std::string(47, '-') + "On"));
     fuse_->Set("hbm on ON");
     ASSERT_TRUE(WaitForDisableLine("hbm on ON"));
-    EXPECT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 0); }));
+    // The worker may lag behind the monitor: wait until it has applied every item.
+    ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 3));
+    EXPECT_EQ(0, service_->SnapshotModeBlock(kAlsBlock).enable_count);
 }
 
 }  // namespace
