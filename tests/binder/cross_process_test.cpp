@@ -363,6 +363,18 @@ TEST_F(CrossProcessTest, ClientDeathIsSeenByTheService) {
     EXPECT_EQ(STATUS_DEAD_OBJECT, callback->OnEvent(Event()).getStatus());
 }
 
+TEST_F(CrossProcessTest, ProcessWithoutPoolGetsOnlyNestedCalls) {
+    auto service = ndk::SharedRefBase::make<TestService>();
+    ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "vyr.local"));
+    pid_t pid = Spawn("nopool", "vyr.local");
+    ASSERT_GT(pid, 0);
+    int status = -1;
+    ASSERT_EQ(pid, waitpid(pid, &status, 0));
+    children_.clear();
+    ASSERT_TRUE(WIFEXITED(status));
+    EXPECT_EQ(0, WEXITSTATUS(status));
+}
+
 TEST_F(CrossProcessTest, OnewayCallsArrive) {
     std::shared_ptr<IVYRService> service = StartServer("vyr.test");
     ASSERT_NE(nullptr, service);

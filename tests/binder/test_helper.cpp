@@ -2,6 +2,8 @@
 //   binder_test_helper serve <name>            publishes a TestService as <name> and an echo
 //                                              binder as <name>.echo, then serves for ever
 //   binder_test_helper client <name>           hands a RecordingCallback to <name> and waits
+//   binder_test_helper nopool <name>           without a thread pool: exits 0 when calls nested
+//                                              in its own call arrive and others do not
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <unistd.h>
@@ -40,11 +42,28 @@ int Client(const std::string& name) {
     for (;;) pause();
 }
 
+int NoPool(const std::string& name) {
+    ndk::SpAIBinder binder(AServiceManager_getService(name.c_str()));
+    std::shared_ptr<IVYRService> service = IVYRService::fromBinder(binder);
+    if (service == nullptr) return 2;
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    int32_t result = 0;
+    // Delivered while this thread waits for the reply.
+    if (!service->SetCallback(2, callback, &result).isOk() || callback->events().size() != 2) {
+        return 3;
+    }
+    // Sent from another service thread later: nothing here serves it.
+    if (!service->Close(1).isOk()) return 4;
+    usleep(300 * 1000);
+    return callback->events().size() == 2 ? 0 : 5;
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
-    fprintf(stderr, "usage: %s serve|client <name>\n", argv[0]);
+    if (argc == 3 && strcmp(argv[1], "nopool") == 0) return NoPool(argv[2]);
+    fprintf(stderr, "usage: %s serve|client|nopool <name>\n", argv[0]);
     return 64;
 }

@@ -8,9 +8,6 @@
 #ifndef __INTRODUCED_IN
 #define __INTRODUCED_IN(api)
 #endif
-#ifndef __ANDROID_API__
-#define __ANDROID_API__ 10000
-#endif
 
 __BEGIN_DECLS
 
