@@ -430,7 +430,9 @@ TEST_F(CrossProcessTest, MissingServicesAreNull) {
     EXPECT_EQ(nullptr, AServiceManager_checkService("vyr.missing"));
     auto start = std::chrono::steady_clock::now();
     EXPECT_EQ(nullptr, AServiceManager_getService("vyr.missing"));
-    EXPECT_LT(std::chrono::steady_clock::now() - start, 5s);
+    auto waited = std::chrono::steady_clock::now() - start;
+    EXPECT_GE(waited, 4s);
+    EXPECT_LT(waited, 30s);
     EXPECT_EQ(nullptr, AServiceManager_checkService("bad name"));
 }
 

@@ -12,9 +12,9 @@ namespace {
 using vyr_binder::ProcessState;
 using vyr_binder::Registry;
 
-// getService waits this long for a name to appear, as the platform's lookup waits a little for
-// a service that is still starting.
-constexpr std::chrono::milliseconds kGetServiceWait(1000);
+// getService waits this long for a name to appear, as the platform's lookup does for a service
+// that is still starting.
+constexpr std::chrono::milliseconds kGetServiceWait(5000);
 
 AIBinder* Released(ndk::SpAIBinder binder) {
     AIBinder* raw = binder.get();

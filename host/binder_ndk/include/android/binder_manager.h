@@ -12,7 +12,7 @@ __attribute__((warn_unused_result)) binder_exception_t AServiceManager_addServic
     AIBinder* binder, const char* instance) __INTRODUCED_IN(29);
 
 // The binder published under the name, with a strong reference for the caller, or null.
-// checkService answers at once; getService waits a short bounded time for the name to appear;
+// checkService answers at once; getService waits up to 5 s for the name to appear;
 // waitForService waits until it does.
 __attribute__((warn_unused_result)) AIBinder* AServiceManager_checkService(const char* instance)
     __INTRODUCED_IN(29);
