@@ -46,11 +46,13 @@ class Stream {
     int Run() {
         std::string what = std::string("open ") + ModeName(options_.mode);
         int32_t result = 0;
-        if (!Check(service_->Open(options_.mode, &result), result, what, err_)) return 1;
+        // Each call runs before its result is read: argument order is unspecified.
+        ndk::ScopedAStatus status = service_->Open(options_.mode, &result);
+        if (!Check(status, result, what, err_)) return 1;
         handle_ = result;
-        int status = Setup() ? Loop() : 1;
+        int exit_status = Setup() ? Loop() : 1;
         Teardown();
-        return status;
+        return exit_status;
     }
 
   private:
@@ -59,19 +61,25 @@ class Stream {
         if (options_.low_power) {
             // A refusal (range handles) is worth a warning, not the end of the stream.
             ndk::ScopedAStatus status = service_->EnableLowPower(handle_, true, &result);
-            Check(status, result, "lowpower", err_);
+            if (status.isOk() && result != 0) {
+                err_->WriteLine("warning: lowpower -> " + DescribeResult(result) +
+                                " (only the light sensor has a low-power mode); going on without");
+            } else if (!status.isOk()) {
+                err_->WriteLine("warning: lowpower: " + DescribeStatus(status));
+            }
         }
         if (options_.use_callback) {
             Connection::StartThreadPool();
             EventQueue* queue = &queue_;
             callback_ = ndk::SharedRefBase::make<ForwardingCallback>(
                 [queue](const Event& event) { queue->Push(event); });
-            if (!Check(service_->SetCallback(handle_, callback_, &result), result, "callback",
-                       err_)) {
+            ndk::ScopedAStatus status = service_->SetCallback(handle_, callback_, &result);
+            if (!Check(status, result, "callback", err_)) {
                 return false;
             }
         }
-        if (!Check(service_->Enable(handle_, options_.period_ms, &result), result, "enable", err_)) {
+        ndk::ScopedAStatus status = service_->Enable(handle_, options_.period_ms, &result);
+        if (!Check(status, result, "enable", err_)) {
             return false;
         }
         enabled_ = true;
