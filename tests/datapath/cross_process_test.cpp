@@ -159,6 +159,17 @@ TEST_F(CrossProcessTest, InterruptedStreamDisablesAndClosesItsHandle) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
+TEST_F(CrossProcessTest, RangeStreamGoesOnWhenLowPowerIsRefused) {
+    auto stream =
+        Vyrctl({"stream", "range", "--low-power", "--period", "50", "--count", "2", "--json"});
+    std::optional<std::string> line = stream->ReadLine(kWait);
+    ASSERT_TRUE(line);
+    EXPECT_NE(line->find("\"sensor\":\"range\""), std::string::npos) << *line;
+    EXPECT_TRUE(stream->ReadLine(kWait));
+    EXPECT_TRUE(ExitedWith(stream->Wait(kWait), 0));
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
 TEST_F(CrossProcessTest, TwoClientsEachTakeEverySampleOnce) {
     int32_t first = 0;
     int32_t second = 0;
