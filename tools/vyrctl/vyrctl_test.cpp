@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "demo_screen.h"
 #include "event_format.h"
 #include "line_writer.h"
 #include "options.h"
@@ -207,6 +208,48 @@ TEST(EventFormatTest, AlsJsonNamesTheValues) {
               "{\"sensor\":\"als\",\"handle\":9,\"status\":1,\"timestamp\":7,\"value0\":4500,"
               "\"value1\":120.5,\"data\":[1,2,3,5,4],\"lux\":120.5,\"color_temperature\":4500,"
               "\"channels\":[1,2,3,5,4]}");
+}
+
+DemoState StateWithThreeZones() {
+    DemoState state;
+    state.elapsed_s = 7.5;
+    state.total_s = 15;
+    state.torch_on = true;
+    RangeFrame frame;
+    frame.reported_zones = 3;
+    frame.frame_number = 12;
+    frame.zones = {{0, 1200}, {5, 1350}, {4, 980}};
+    state.range = frame;
+    state.range_events = 3;
+    state.als_problem = "not available: open -> -19 (sensor unavailable)";
+    return state;
+}
+
+TEST(DemoScreenTest, PlainLineShowsZonesRowByRow) {
+    EXPECT_EQ(DemoScreen::PlainLine(StateWithThreeZones()),
+              "[  7.5 s] range mm:  1200 mm [0]  1350 mm [5] /   980 mm [4] -- | light: not "
+              "available: open -> -19 (sensor unavailable) | torch ON");
+}
+
+TEST(DemoScreenTest, PanelPutsTheSensorsSideBySide) {
+    std::vector<std::string> panel = DemoScreen::Panel(StateWithThreeZones());
+    ASSERT_GE(panel.size(), 8u);
+    EXPECT_EQ(panel[0], "vyrservice live view     7.5 s of 15 s   torch ON");
+    EXPECT_EQ(panel[2].find("RANGE"), 0u);
+    EXPECT_NE(panel[2].find("LIGHT"), std::string::npos);
+    EXPECT_NE(panel[4].find("not available"), std::string::npos);
+    EXPECT_NE(panel[5].find(" 1200 mm [0] "), std::string::npos);
+    EXPECT_GT(panel[5].find(" 1350 mm [5] "), panel[5].find(" 1200 mm [0] "));
+    EXPECT_NE(panel[7].find(" 980 mm [4] "), std::string::npos);
+    EXPECT_NE(panel[7].find("--"), std::string::npos);
+}
+
+TEST(DemoScreenTest, WaitingBeforeTheFirstSample) {
+    DemoState state;
+    state.total_s = 15;
+    state.torch_at_s = 7.5;
+    EXPECT_EQ(DemoScreen::PlainLine(state),
+              "[  0.0 s] range mm: (waiting) | light: (waiting) | torch off (turns on at 7.5 s)");
 }
 
 TEST_F(ShellTest, PrintsOneResultLinePerCommand) {
