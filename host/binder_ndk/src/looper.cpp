@@ -144,8 +144,11 @@ void Looper::Run(Kind kind) {
         if (executor) --idle_executors_;
         if (n <= 0 || event.data.u64 == kStopTag) continue;
         if (event.data.u64 == kWorkTag) {
-            // Only an executor takes work; anyone else passes the wake-up on.
-            if (!(kind != Kind::kLooper || started_) && !queue_.empty()) ArmWorkLocked();
+            // Only an executor takes work. Anyone else passes the wake-up on to an idle executor
+            // (waiters are woken oldest first, so not back to itself); busy executors look at
+            // the queue anyway before they wait again.
+            bool can_take = kind != Kind::kLooper || started_;
+            if (!can_take && !queue_.empty() && idle_executors_ > 0) ArmWorkLocked();
             continue;
         }
         auto it = connections_.find(event.data.u64);
