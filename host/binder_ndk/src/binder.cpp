@@ -154,6 +154,7 @@ binder_status_t AIBinder_prepareTransaction(AIBinder* binder, AParcel** in) {
     const AIBinder_Class* clazz = binder->GetClass();
     if (clazz == nullptr) return STATUS_INVALID_OPERATION;
     std::unique_ptr<AParcel> parcel(new AParcel);
+    parcel->data.reserve(vyr_binder::kSmallParcelBytes);
     AIBinder_incStrong(binder);
     parcel->target.set(binder);
     if (clazz->write_header) {

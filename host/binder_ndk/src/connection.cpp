@@ -28,6 +28,7 @@ Looper& TheLooper() {
 }  // namespace
 
 Connection::Connection(int fd) : fd_(fd) {
+    waiters_.reserve(16);
     ucred cred{};
     socklen_t len = sizeof(cred);
     if (getsockopt(fd_, SOL_SOCKET, SO_PEERCRED, &cred, &len) == 0) {
@@ -162,6 +163,23 @@ ndk::SpAIBinder Connection::ProxyForLocked(uint64_t id, const std::string& descr
     return ndk::SpAIBinder(proxy);
 }
 
+Connection::Waiter* Connection::FindWaiterLocked(uint64_t id) const {
+    for (const auto& entry : waiters_) {
+        if (entry.first == id) return entry.second;
+    }
+    return nullptr;
+}
+
+void Connection::RemoveWaiterLocked(uint64_t id) {
+    for (auto& entry : waiters_) {
+        if (entry.first == id) {
+            entry = waiters_.back();
+            waiters_.pop_back();
+            return;
+        }
+    }
+}
+
 void Connection::ForgetProxy(ProxyBinder* proxy) {
     uint32_t acquired;
     {
@@ -251,13 +269,13 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         binder_status_t status = EncodeObjectsLocked(in, &objects);
         if (status != STATUS_OK) return status;
         id = next_transaction_id_++;
-        if (!oneway) waiters_[id] = &waiter;
+        if (!oneway) waiters_.emplace_back(id, &waiter);
     }
     uint64_t parent = ScopedCallContext::ParentFor(this);
     if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects)) {
         Close();
         std::lock_guard<std::mutex> lock(mutex_);
-        waiters_.erase(id);
+        RemoveWaiterLocked(id);
         return STATUS_DEAD_OBJECT;
     }
     if (oneway) return STATUS_OK;
@@ -267,7 +285,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         if (!waiter.nested.empty()) {
             // The peer calls back into us while serving our call: serve it on this thread.
             std::shared_ptr<Incoming> call = std::move(waiter.nested.front());
-            waiter.nested.pop_front();
+            waiter.nested.erase(waiter.nested.begin());
             lock.unlock();
             Serve(*call);
             call.reset();
@@ -306,8 +324,8 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             lock.lock();
         }
     }
-    waiters_.erase(id);
-    std::deque<std::shared_ptr<Incoming>> dropped = std::move(waiter.nested);
+    RemoveWaiterLocked(id);
+    std::vector<std::shared_ptr<Incoming>> dropped = std::move(waiter.nested);
     std::unique_ptr<AParcel> reply = std::move(waiter.reply);
     binder_status_t status = waiter.status;
     lock.unlock();
@@ -324,9 +342,8 @@ bool Connection::HandleReply(Frame& frame) {
     std::unique_ptr<AParcel> reply(new AParcel);
     if (!DecodeParcel(frame, reply.get())) return false;
     std::lock_guard<std::mutex> lock(mutex_);
-    auto it = waiters_.find(frame.header.transaction_id);
-    if (it == waiters_.end()) return false;
-    Waiter* waiter = it->second;
+    Waiter* waiter = FindWaiterLocked(frame.header.transaction_id);
+    if (waiter == nullptr) return false;
     waiter->status = static_cast<binder_status_t>(frame.header.code);
     waiter->reply = std::move(reply);
     waiter->done = true;
@@ -352,10 +369,10 @@ bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out)
         auto it = exports_.find(header.target);
         if (it != exports_.end()) call->target = it->second.binder;
         if (header.parent != 0 && !oneway && call->target.get() != nullptr) {
-            auto waiter = waiters_.find(header.parent);
-            if (waiter != waiters_.end()) {
-                waiter->second->nested.push_back(std::move(call));
-                waiter->second->cv.notify_one();
+            Waiter* waiter = FindWaiterLocked(header.parent);
+            if (waiter != nullptr) {
+                waiter->nested.push_back(std::move(call));
+                waiter->cv.notify_one();
                 return true;
             }
         }
@@ -403,6 +420,7 @@ void Connection::Dispatch(std::shared_ptr<Incoming> call, bool can_serve) {
 void Connection::Serve(Incoming& call) {
     ScopedCallContext context(peer_uid_, peer_pid_, this, call.id);
     AParcel reply;
+    reply.data.reserve(kSmallParcelBytes);
     call.data->pos = 0;
     binder_status_t status =
         call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);

@@ -7,11 +7,11 @@
 #include <atomic>
 #include <condition_variable>
 #include <cstdint>
-#include <deque>
 #include <memory>
 #include <mutex>
 #include <string>
 #include <unordered_map>
+#include <utility>
 #include <vector>
 
 #include "frame_io.h"
@@ -71,7 +71,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
         bool done = false;
         binder_status_t status = STATUS_OK;
         std::unique_ptr<AParcel> reply;
-        std::deque<std::shared_ptr<Incoming>> nested;
+        std::vector<std::shared_ptr<Incoming>> nested;  // oldest first
     };
     struct Export {
         ndk::SpAIBinder binder;
@@ -95,6 +95,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
     bool DecodeParcel(Frame& frame, AParcel* parcel);
     binder_status_t EncodeObjectsLocked(const AParcel& parcel, std::vector<WireObject>* objects);
     ndk::SpAIBinder ProxyForLocked(uint64_t id, const std::string& descriptor);
+    Waiter* FindWaiterLocked(uint64_t id) const;
+    void RemoveWaiterLocked(uint64_t id);
     bool Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
               uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects);
     void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
@@ -109,7 +111,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
 
     std::mutex mutex_;
     uint64_t next_transaction_id_ = 1;
-    std::unordered_map<uint64_t, Waiter*> waiters_;
+    // Few at a time: a flat table spares an allocation per call.
+    std::vector<std::pair<uint64_t, Waiter*>> waiters_;
     std::unordered_map<uint64_t, Export> exports_;
     std::unordered_map<uint64_t, ProxyBinder*> proxies_;
     bool hello_seen_ = false;

@@ -17,6 +17,8 @@ struct ParcelObject {
 
 // Writes past this size fail with STATUS_NO_MEMORY; what may cross a process is far smaller.
 constexpr size_t kMaxParcelBytes = 64u << 20;
+// Room reserved up front in the parcels of a call, enough for most, so they grow once at most.
+constexpr size_t kSmallParcelBytes = 256;
 
 }  // namespace vyr_binder
 
