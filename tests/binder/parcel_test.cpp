@@ -9,6 +9,8 @@
 #include <string>
 #include <vector>
 
+#include "echo_binder.h"
+
 namespace {
 
 using aidl::android::vyr::Event;
@@ -263,6 +265,29 @@ TEST_F(ParcelTest, NullBinderRoundTripAndBadObjectIndex) {
     ASSERT_EQ(STATUS_OK, AParcel_readStrongBinder(p, &binder));
     EXPECT_EQ(nullptr, binder);
     EXPECT_EQ(STATUS_BAD_VALUE, AParcel_readStrongBinder(p, &binder));
+}
+
+TEST_F(ParcelTest, LocalBinderRoundTripHoldsAReference) {
+    ndk::SpAIBinder binder = vyr_binder_test::MakeEcho();
+    AParcel* p = parcel_.get();
+    ASSERT_EQ(STATUS_OK, AParcel_writeStrongBinder(p, binder.get()));
+    ASSERT_EQ(STATUS_OK, AParcel_writeStrongBinder(p, binder.get()));
+    EXPECT_EQ(3, AIBinder_debugGetRefCount(binder.get()));
+    Rewind();
+    ndk::SpAIBinder first;
+    ndk::SpAIBinder second;
+    ASSERT_EQ(STATUS_OK, AParcel_readStrongBinder(p, first.getR()));
+    ASSERT_EQ(STATUS_OK, AParcel_readStrongBinder(p, second.getR()));
+    EXPECT_EQ(binder.get(), first.get());
+    EXPECT_EQ(binder.get(), second.get());
+    // Reading again from the start gives the same object again.
+    Rewind();
+    ndk::SpAIBinder again;
+    ASSERT_EQ(STATUS_OK, AParcel_readStrongBinder(p, again.getR()));
+    EXPECT_EQ(binder.get(), again.get());
+    ASSERT_EQ(STATUS_OK, AParcel_reset(p));
+    EXPECT_EQ(4, AIBinder_debugGetRefCount(binder.get()));
+    EXPECT_EQ(0, AParcel_getDataSize(p));
 }
 
 TEST_F(ParcelTest, FileDescriptorsAreRefused) {

@@ -64,7 +64,11 @@ void FrameBuffer::Take(Frame* frame) {
     const uint8_t* table = data + frame->header.data_size;
     frame->table.assign(table, table + frame->header.table_size);
     begin_ += FrameSize(frame->header);
-    if (begin_ == end_) begin_ = end_ = 0;
+    if (begin_ == end_) {
+        begin_ = end_ = 0;
+        // Give back the room a large frame took.
+        if (buffer_.size() > 4 * kReadChunk) std::vector<uint8_t>(kReadChunk).swap(buffer_);
+    }
 }
 
 bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
