@@ -16,9 +16,9 @@
 // End of stdin, SIGTERM, SIGINT and SIGHUP end the command too. With --no-stdin, stdin is not
 // read (for runs in the background); use `vyr-sandbox panel` and signals instead. When the command
 // has ended it prints "exit S" and exits with S: the command's exit code, or 128 + the signal that
-// killed it. The command's stdout is sent to stderr so that stdout carries only the lines above. Statuses
-// of its own: 77 without the privilege to create namespaces, 125 when setting up fails, 127 when
-// COMMAND cannot be run.
+// killed it. The command's stdout is sent to stderr so that stdout carries only the lines above.
+// Statuses of its own: 77 without the privilege to create namespaces, 125 when setting up fails,
+// 127 when COMMAND cannot be run.
 //
 // `panel` sets the state of the sandbox that contains process PID (the sandbox or its command).
 //
