@@ -426,6 +426,60 @@ TEST_F(CrossProcessTest, SixteenThreadsCallAtOnce) {
     EXPECT_EQ(0, failures.load());
 }
 
+TEST_F(CrossProcessTest, PeerDeathDuringManyCallsFailsEveryOneOfThem) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, service);
+    std::atomic<int> calls{0};
+    std::atomic<int> bad_status{0};
+    std::vector<std::thread> threads;
+    for (int t = 0; t < 8; ++t) {
+        threads.emplace_back([&] {
+            for (;;) {
+                int32_t result = 0;
+                binder_status_t status = service->Enable(1, 2, &result).getStatus();
+                if (status == STATUS_DEAD_OBJECT) return;
+                if (status != STATUS_OK) ++bad_status;
+                ++calls;
+            }
+        });
+    }
+    ASSERT_TRUE(Eventually([&] { return calls.load() > 200; }));
+    Kill(pid);
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(0, bad_status.load());
+    EXPECT_FALSE(AIBinder_isAlive(service->asBinder().get()));
+}
+
+TEST_F(CrossProcessTest, CallbacksAndCallsCrossEachOther) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    int32_t result = 0;
+    ASSERT_TRUE(service->SetCallback(0, callback, &result).isOk());
+    // The service pushes events from its own thread while this side keeps calling it.
+    ASSERT_TRUE(service->Close(300).isOk());
+    std::vector<std::thread> threads;
+    std::atomic<int> failures{0};
+    for (int t = 0; t < 4; ++t) {
+        threads.emplace_back([&] {
+            for (int i = 0; i < 100; ++i) {
+                int32_t r = 0;
+                if (!service->Open(i, &r).isOk() || r != i * 10) ++failures;
+            }
+        });
+    }
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(0, failures.load());
+    ASSERT_TRUE(callback->WaitForEvents(300));
+    std::vector<Event> events = callback->events();
+    ASSERT_EQ(300u, events.size());
+    // One sender thread, two-way calls: they arrive in order.
+    for (size_t i = 0; i < events.size(); ++i) {
+        EXPECT_EQ(1000000000000LL + static_cast<int64_t>(i), events[i].timestamp);
+    }
+}
+
 TEST_F(CrossProcessTest, MissingServicesAreNull) {
     EXPECT_EQ(nullptr, AServiceManager_checkService("vyr.missing"));
     auto start = std::chrono::steady_clock::now();
