@@ -40,8 +40,13 @@ class FakeService : public aidl::android::vyr::BnVYRService {
         calls.push_back("Disable " + std::to_string(handle));
         return ndk::ScopedAStatus::ok();
     }
-    ndk::ScopedAStatus SetCallback(int32_t, const std::shared_ptr<IEventCallback>&,
+    // Delivers one event at once, as a running service would soon after.
+    ndk::ScopedAStatus SetCallback(int32_t, const std::shared_ptr<IEventCallback>& callback,
                                    int32_t* result) override {
+        Event event{};
+        event.timestamp = 5;
+        event.data = {1.5f};
+        callback->OnEvent(event);
         *result = 0;
         return ndk::ScopedAStatus::ok();
     }
@@ -280,6 +285,13 @@ TEST_F(ShellTest, BadInputGivesAnErrorLineAndGoesOn) {
     EXPECT_EQ(lines[4], "error: lowpower takes 0 or 1, not 2");
     EXPECT_EQ(lines[5], "open 2 -> -22 (invalid argument or handle)");
     EXPECT_EQ(service_->calls, std::vector<std::string>{"Open 2"});
+}
+
+TEST_F(ShellTest, CallbackEventsArePrintedAsEventLines) {
+    std::vector<std::string> lines = RunLines({"callback 42"});
+    ASSERT_EQ(lines.size(), 2u);
+    EXPECT_EQ(lines[0], "event 42 status=0 timestamp=5 value0=0 value1=0 data=[1.5]");
+    EXPECT_EQ(lines[1], "callback 42 -> 0");
 }
 
 TEST_F(ShellTest, ConfigurePassesTheValuesOn) {
