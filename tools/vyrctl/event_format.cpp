@@ -22,7 +22,6 @@ RangeFrame DecodeRange(const Event& event) {
     RangeFrame frame;
     const std::vector<float>& data = event.data;
     if (data.size() < kRangeHeaderFloats) return frame;
-    frame.sensor_time_ms = data[0];
     frame.frame_number = data[kRangeFrameNumberIndex];
     frame.reported_zones = static_cast<int>(data[kRangeZoneCountIndex]);
     size_t available = (data.size() - kRangeHeaderFloats) / kRangeZoneFloats;

@@ -23,7 +23,6 @@ struct RangeZone {
 };
 
 struct RangeFrame {
-    float sensor_time_ms = 0;
     float frame_number = 0;
     int reported_zones = 0;
     std::vector<RangeZone> zones;
