@@ -3,6 +3,8 @@
 
 #include <cutils/properties.h>
 
+#include <cerrno>
+#include <cinttypes>
 #include <cstdlib>
 #include <cstring>
 #include <optional>
@@ -19,6 +21,21 @@ std::optional<std::string> ReadProperty(const char* key) {
     const char* path = getenv(kPropertyFileVariable);
     if (path == nullptr || *path == '\0') return std::nullopt;
     return host_properties::LookUp(path, key);
+}
+
+// As the platform parses numbers: any base strtoimax accepts, text after the number ignored, and
+// the default for no number, overflow or a value outside [lower, upper].
+intmax_t GetInteger(const char* key, intmax_t lower, intmax_t upper, intmax_t default_value) {
+    char value[PROPERTY_VALUE_MAX];
+    if (key == nullptr || property_get(key, value, "") == 0) return default_value;
+    const int saved_errno = errno;
+    errno = 0;
+    char* end = nullptr;
+    intmax_t result = strtoimax(value, &end, 0);
+    const bool overflow = errno == ERANGE;
+    errno = saved_errno;
+    if (overflow || end == value || result < lower || result > upper) result = default_value;
+    return result;
 }
 
 }  // namespace
@@ -44,4 +61,12 @@ extern "C" int8_t property_get_bool(const char* key, int8_t default_value) {
     if (v == "1" || v == "y" || v == "yes" || v == "on" || v == "true") return 1;
     if (v == "0" || v == "n" || v == "no" || v == "off" || v == "false") return 0;
     return default_value;
+}
+
+extern "C" int64_t property_get_int64(const char* key, int64_t default_value) {
+    return static_cast<int64_t>(GetInteger(key, INT64_MIN, INT64_MAX, default_value));
+}
+
+extern "C" int32_t property_get_int32(const char* key, int32_t default_value) {
+    return static_cast<int32_t>(GetInteger(key, INT32_MIN, INT32_MAX, default_value));
 }

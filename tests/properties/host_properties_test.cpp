@@ -148,4 +148,22 @@ TEST_F(HostPropertiesTest, PropertyGetTruncatesLongValues) {
     EXPECT_EQ(std::string(value), std::string(PROPERTY_VALUE_MAX - 1, 'x'));
 }
 
+TEST_F(HostPropertiesTest, IntegersParseLikeThePlatform) {
+    Write(
+        "dec=42\nneg=-7\nhex=0x10\noct=010\ntail=12abc\nword=abc\nempty=\nbig=4294967296\n"
+        "huge=99999999999999999999\n");
+    EXPECT_EQ(property_get_int32("dec", -1), 42);
+    EXPECT_EQ(property_get_int32("neg", -1), -7);
+    EXPECT_EQ(property_get_int32("hex", -1), 16);
+    EXPECT_EQ(property_get_int32("oct", -1), 8);
+    EXPECT_EQ(property_get_int32("tail", -1), 12);
+    EXPECT_EQ(property_get_int32("word", -1), -1);
+    EXPECT_EQ(property_get_int32("empty", -1), -1);
+    EXPECT_EQ(property_get_int32("absent", -1), -1);
+    EXPECT_EQ(property_get_int32("big", -1), -1) << "outside 32 bits";
+    EXPECT_EQ(property_get_int64("big", -1), 4294967296LL);
+    EXPECT_EQ(property_get_int64("huge", -1), -1) << "overflow";
+    EXPECT_EQ(property_get_int64(nullptr, 5), 5);
+}
+
 }  // namespace
