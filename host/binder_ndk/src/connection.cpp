@@ -401,7 +401,9 @@ void Connection::Dispatch(std::shared_ptr<Incoming> call, bool can_serve) {
     if (call->drain_oneway) {
         ndk::SpAIBinder target = call->target;
         if (can_serve) {
+            TheLooper().BeforeServingInline();
             static_cast<LocalBinder*>(target.get())->DrainOneway();
+            TheLooper().AfterServingInline();
         } else {
             TheLooper().Enqueue(
                 [target] { static_cast<LocalBinder*>(target.get())->DrainOneway(); });
@@ -411,6 +413,7 @@ void Connection::Dispatch(std::shared_ptr<Incoming> call, bool can_serve) {
     if (can_serve) {
         TheLooper().BeforeServingInline();
         Serve(*call);
+        TheLooper().AfterServingInline();
         return;
     }
     std::shared_ptr<Connection> self = shared_from_this();

@@ -90,14 +90,25 @@ void Looper::Enqueue(std::function<void()> work) {
     queue_.push_back(std::move(work));
     if (!HaveExecutorsLocked()) return;
     ArmWorkLocked();
-    if (started_ && idle_executors_ == 0 && spawned_ < max_threads_) SpawnLocked(Kind::kPool);
+    SpawnIfAllBusyLocked();
+}
+
+void Looper::SpawnIfAllBusyLocked() {
+    // Counting busy threads, not waiting ones: a thread that just replied is about to wait again.
+    if (started_ && !stopping_ && serving_ >= ExecutorsLocked() && spawned_ < max_threads_) {
+        SpawnLocked(Kind::kPool);
+    }
 }
 
 void Looper::BeforeServingInline() {
     std::lock_guard<std::mutex> lock(mutex_);
-    if (started_ && !stopping_ && idle_executors_ == 0 && spawned_ < max_threads_) {
-        SpawnLocked(Kind::kPool);
-    }
+    ++serving_;
+    SpawnIfAllBusyLocked();
+}
+
+void Looper::AfterServingInline() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    --serving_;
 }
 
 void Looper::RunTask(std::function<void()> task) {
@@ -130,10 +141,12 @@ void Looper::Run(Kind kind) {
             std::function<void()> work = std::move(queue_.front());
             queue_.pop_front();
             if (!queue_.empty()) ArmWorkLocked();
+            ++serving_;
             lock.unlock();
             work();
             work = nullptr;
             lock.lock();
+            --serving_;
             continue;
         }
         if (executor) ++idle_executors_;
@@ -232,6 +245,7 @@ void Looper::Shutdown() {
     if (read(stop_fd_, &value, sizeof(value)) < 0) value = 0;
     queue_.clear();
     spawned_ = 0;
+    serving_ = 0;
     looper_running_ = false;
     started_ = false;
     stopping_ = false;

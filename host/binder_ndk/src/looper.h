@@ -36,8 +36,10 @@ class Looper {
     void Join();
     // Runs `work` on a pool thread, once there is one.
     void Enqueue(std::function<void()> work);
-    // Called by a pool thread about to serve a call itself: keeps a thread free for reading.
+    // Bracket a call a pool thread serves itself; when every pool thread is busy serving,
+    // another is started so that someone still reads.
     void BeforeServingInline();
+    void AfterServingInline();
     // Runs `task` on a runtime thread now, pool or not (death notices).
     void RunTask(std::function<void()> task);
 
@@ -62,6 +64,8 @@ class Looper {
     void SpawnLocked(Kind kind);
     void ArmWorkLocked();
     bool HaveExecutorsLocked() const { return started_ || joined_ > 0; }
+    uint32_t ExecutorsLocked() const { return (started_ ? spawned_ : 0) + joined_; }
+    void SpawnIfAllBusyLocked();
     void Control(int op, int fd, uint32_t events, uint64_t tag);
 
     const int epoll_fd_;
@@ -77,7 +81,8 @@ class Looper {
     uint64_t next_serial_ = 1;
     uint32_t max_threads_ = kDefaultMaxThreads;
     uint32_t spawned_ = 0;
-    uint32_t idle_executors_ = 0;
+    uint32_t idle_executors_ = 0;  // waiting in epoll
+    uint32_t serving_ = 0;         // running a call or queued work
     uint32_t joined_ = 0;
     bool looper_running_ = false;
     bool started_ = false;
