@@ -493,7 +493,6 @@ void Connection::Die() {
     }
     shutdown(fd_, SHUT_RDWR);
     std::shared_ptr<Connection> self = shared_from_this();
-    TheLooper().Remove(*this);
     exports.clear();
     auto notify = [proxies = std::move(proxies)] {
         for (const ndk::SpAIBinder& proxy : proxies) {
@@ -506,6 +505,8 @@ void Connection::Die() {
     } else {
         TheLooper().RunTask(std::move(notify));
     }
+    // Last: once no connection is left, every notice has run or has its thread (shutdown).
+    TheLooper().Remove(*this);
 }
 
 }  // namespace vyr_binder
