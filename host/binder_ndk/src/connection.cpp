@@ -273,9 +273,12 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
     }
     uint64_t parent = ScopedCallContext::ParentFor(this);
     if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects)) {
-        Close();
-        std::lock_guard<std::mutex> lock(mutex_);
-        RemoveWaiterLocked(id);
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            RemoveWaiterLocked(id);
+        }
+        // The peer is gone: its objects are dead from now on, not only once someone reads.
+        Die();
         return STATUS_DEAD_OBJECT;
     }
     if (oneway) return STATUS_OK;
@@ -458,7 +461,7 @@ void Connection::SendReply(uint64_t id, binder_status_t status, const AParcel& r
     const AParcel* body = status == STATUS_OK ? &reply : nullptr;
     if (status != STATUS_OK) objects.clear();
     if (!Send(FrameType::kReply, static_cast<uint32_t>(status), 0, id, 0, 0, body, objects)) {
-        Close();
+        Die();
     }
 }
 
