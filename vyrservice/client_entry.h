@@ -1,6 +1,7 @@
 #pragma once
 
 #include <aidl/android/vyr/IEventCallback.h>
+#include <android/binder_auto_utils.h>
 #include <android/binder_ibinder.h>
 
 #include <atomic>
@@ -38,8 +39,8 @@ struct ClientEntry {
     std::unique_ptr<std::thread> notify_thread;
     std::unique_ptr<std::condition_variable> notify_cv;
     std::unique_ptr<std::mutex> notify_mutex;
-    // Not owning: `callback` keeps the binder alive.
-    AIBinder* callback_binder = nullptr;
+    // Held strongly: an in-process callback keeps only a weak reference to its own binder.
+    ndk::SpAIBinder callback_binder;
     AIBinder_DeathRecipient* death_recipient = nullptr;
     // Owned by the service, which keeps every cookie for as long as a link made with it can
     // fire, also after this entry is gone.

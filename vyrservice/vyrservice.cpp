@@ -159,7 +159,10 @@ WorkQueue& VYRService::QueueForMode(int32_t mode) {
 }
 
 VYRService::ModeBlockSnapshot VYRService::SnapshotModeBlock(size_t index) {
-    std::scoped_lock lock(sensor_locks_[0], sensor_locks_[1]);
+    // The lock of the worker that changes the block: the range worker owns the range block.
+    std::lock_guard<std::mutex> lock(
+        sensor_locks_[index == static_cast<size_t>(range_params_index_) ? kRangeSensorType
+                                                                        : kAlsSensorType]);
     ServiceModeParams& params = mode_params_.at(index);
     return ModeBlockSnapshot{params.running.load(), params.mode.load(), params.enable_count,
                              params.active_period.load(), params.periods};
@@ -307,14 +310,14 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
         return Ok();
     }
     entry.callback = callback;
-    entry.callback_binder = entry.callback->asBinder().get();
+    entry.callback_binder = entry.callback->asBinder();
 
     DeathLink& link = death_links_.emplace_back(DeathLink{
-        std::make_unique<DeathCookie>(entry.callback_binder, this),
+        std::make_unique<DeathCookie>(entry.callback_binder.get(), this),
         {AIBinder_DeathRecipient_new(&VYRService::OnBinderDied), &AIBinder_DeathRecipient_delete}});
     entry.death_cookie = link.cookie.get();
     entry.death_recipient = link.recipient.get();
-    AIBinder_linkToDeath(entry.callback_binder, entry.death_recipient, link.cookie.get());
+    AIBinder_linkToDeath(entry.callback_binder.get(), entry.death_recipient, link.cookie.get());
     *result = 0;
     return Ok();
 }
@@ -328,7 +331,7 @@ void VYRService::OnBinderDied(void* cookie) {
 void VYRService::HandleBinderDied(AIBinder* binder) {
     LOCK_API();
     auto it = std::find_if(clients_.begin(), clients_.end(), [binder](const auto& client) {
-        return client.second.callback_binder == binder;
+        return client.second.callback_binder.get() == binder;
     });
     if (it == clients_.end()) {
         return;
@@ -336,7 +339,7 @@ void VYRService::HandleBinderDied(AIBinder* binder) {
     const int32_t handle = it->first;
     ClientEntry& entry = it->second;
     ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry.mode);
-    AIBinder_unlinkToDeath(entry.callback_binder, entry.death_recipient, nullptr);
+    AIBinder_unlinkToDeath(entry.callback_binder.get(), entry.death_recipient, nullptr);
     DisableInternal(handle, true);
     CloseInternal(handle);
 }
@@ -623,22 +626,29 @@ bool VYRService::PollInternal(int32_t handle, int32_t mode, Event* event) {
         }
     }
     // A sample published between the test above and this section is the one taken.
-    ALSResult als_data;
-    MultiRangingData range_data;
+    ALSResult als_data{};
+    MultiRangingData range_data{};
     {
         std::lock_guard<std::mutex> lock(params->data_mutex);
         params->polled_handles.insert(handle);
-        als_data = params->als_data;
-        range_data = params->range_data;
+        if (mode == kRangeMode) {
+            range_data = params->range_data;
+        } else {
+            als_data = params->als_data;
+        }
     }
-    const bool valid = mode == kRangeMode ? range_data.valid != 0 : als_data.valid != 0;
-    if (!valid) {
-        ALOGW("%s, invalid data", __func__);
-        return false;
-    }
+    // Converted outside the lock so that the processing loop waits for one copy at most.
     if (mode == kRangeMode) {
+        if (range_data.valid == 0) {
+            ALOGW("%s, invalid data", __func__);
+            return false;
+        }
         ConvertRangingData(range_data, &local);
     } else {
+        if (als_data.valid == 0) {
+            ALOGW("%s, invalid data", __func__);
+            return false;
+        }
         ConvertAlsResult(als_data, &local);
     }
     event->status = local.status;

@@ -49,7 +49,8 @@ class VYRService : public aidl::android::vyr::BnVYRService {
                                            int32_t* result) override;
     ndk::ScopedAStatus SetTorchLightState(int32_t state) override;
 
-    // A consistent copy of one mode block's scheduling state, for tests and diagnostics.
+    // A consistent copy of one mode block's scheduling state, for tests and diagnostics; waits
+    // for the block's worker to finish the item it is applying.
     struct ModeBlockSnapshot {
         bool running;
         int32_t mode;

@@ -29,7 +29,7 @@ TEST(ApiLockDeathTest, CallThatCannotTakeTheLockWithinTenSecondsAborts) {
     GTEST_FLAG_SET(death_test_style, "threadsafe");
     const auto start = std::chrono::steady_clock::now();
     EXPECT_DEATH(CallWhileTheLockIsHeld(),
-                 "vyrservice/vyrservice\\.cpp:[0-9]+.*Check failed: lck\\.owns_lock\\(\\) ");
+                 "vyrservice F .*vyrservice\\.cpp:[0-9]+\\] Check failed: lck\\.owns_lock\\(\\) ");
     EXPECT_GE(std::chrono::steady_clock::now() - start, 10s);
 }
 

@@ -171,6 +171,7 @@ TEST_F(OpenCloseTest, FirstHandleOfFreshServiceIsSecondDraw) {
 }
 
 TEST_F(OpenCloseTest, ClosedHandleMayBeChosenAgain) {
+    srand(1);
     MakeService();
     srand(1);
     rand();

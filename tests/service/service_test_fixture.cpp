@@ -74,6 +74,9 @@ ServiceConfig ServiceTest::Config(std::map<std::string, bool> properties,
 
 void ServiceTest::MakeService(bool als, bool range) {
     MakeService(Config({{kAlsProperty, als}, {kRangeProperty, range}}));
+    // Settle on the workers alone: the display monitor ends on the unopenable path.
+    const size_t workers = (als ? 1 : 0) + (range ? 1 : 0);
+    EXPECT_TRUE(WaitForThreadCount(baseline_threads_ + workers, kWait));
 }
 
 void ServiceTest::MakeService(const ServiceConfig& config) {
@@ -86,9 +89,14 @@ void ServiceTest::DestroyService() {
     impl_.reset();
 }
 
+size_t ServiceTest::BlockOf(int32_t mode) {
+    return mode == 3 ? 2 : 0;
+}
+
 int32_t ServiceTest::Open(int32_t mode) {
     int32_t handle = 0;
     EXPECT_TRUE(service_->Open(mode, &handle).isOk());
+    modes_[handle] = mode;
     return handle;
 }
 
@@ -104,6 +112,7 @@ int32_t ServiceTest::OpenAndEnable(int32_t mode, int32_t period) {
     const size_t before = WorkLogCount("EnableWork", handle);
     EXPECT_EQ(0, Enable(handle, period));
     EXPECT_TRUE(WaitForWorkLog("EnableWork", handle, before + 1));
+    impl_->SnapshotModeBlock(BlockOf(mode));
     return handle;
 }
 
@@ -111,6 +120,8 @@ void ServiceTest::DisableAndWait(int32_t handle) {
     const size_t before = WorkLogCount("DisableWork", handle);
     EXPECT_TRUE(service_->Disable(handle).isOk());
     EXPECT_TRUE(WaitForWorkLog("DisableWork", handle, before + 1));
+    // The worker logs before its last library call; the snapshot waits for the whole item.
+    impl_->SnapshotModeBlock(BlockOf(modes_[handle]));
 }
 
 namespace {

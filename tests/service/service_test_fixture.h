@@ -62,17 +62,19 @@ class ServiceTest : public ::testing::Test {
 
     ServiceConfig Config(std::map<std::string, bool> properties,
                          const std::string& display_path = kNoDisplayPath);
-    // Both sensors present unless said otherwise.
+    // Both sensors present unless said otherwise; returns once the display monitor has ended.
     void MakeService(bool als = true, bool range = true);
     void MakeService(const ServiceConfig& config);
     // Drops the test's reference; the service is destroyed here.
     void DestroyService();
 
+    // Index of the mode block that serves `mode`.
+    static size_t BlockOf(int32_t mode);
     int32_t Open(int32_t mode);
     int32_t Enable(int32_t handle, int32_t period);
-    // Opens a client of `mode` and enables it; waits until the worker applied the item.
+    // Opens a client of `mode` and enables it; waits until the worker has applied the item.
     int32_t OpenAndEnable(int32_t mode, int32_t period);
-    // Disables and waits until the worker applied the item.
+    // Disables and waits until the worker has applied the item.
     void DisableAndWait(int32_t handle);
     // Number of records of `work` ("EnableWork" / "DisableWork") for `handle`.
     size_t WorkLogCount(const std::string& work, int32_t handle);
@@ -82,6 +84,8 @@ class ServiceTest : public ::testing::Test {
     std::shared_ptr<VYRService> impl_;
     std::shared_ptr<IVYRService> service_;
     size_t baseline_threads_ = 0;
+    // Mode of every handle opened through Open().
+    std::map<int32_t, int32_t> modes_;
 };
 
 }  // namespace vyr_service_test
