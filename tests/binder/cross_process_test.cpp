@@ -6,6 +6,7 @@
 #include <signal.h>
 #include <spawn.h>
 #include <sys/socket.h>
+#include <sys/stat.h>
 #include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -478,6 +479,67 @@ TEST_F(CrossProcessTest, CallbacksAndCallsCrossEachOther) {
     for (size_t i = 0; i < events.size(); ++i) {
         EXPECT_EQ(1000000000000LL + static_cast<int64_t>(i), events[i].timestamp);
     }
+}
+
+TEST_F(CrossProcessTest, ObjectsHeldOnlyByADeadPeerAreReleased) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, service);
+    std::weak_ptr<RecordingCallback> weak;
+    {
+        auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+        weak = callback;
+        int32_t result = 0;
+        ASSERT_TRUE(service->SetCallback(0, callback, &result).isOk());
+    }
+    EXPECT_FALSE(weak.expired());
+    Kill(pid);
+    EXPECT_TRUE(Eventually([&] { return weak.expired(); }));
+}
+
+// Only the owner may reach a process's socket, and a peer of another user is turned away even
+// when the file modes would let it in.
+TEST_F(CrossProcessTest, OtherUsersCannotConnect) {
+    auto service = ndk::SharedRefBase::make<TestService>();
+    ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "vyr.local"));
+    char key[256] = {};
+    std::string entry = registry_.path() + "/svc.vyr.local";
+    ASSERT_GT(readlink(entry.c_str(), key, sizeof(key) - 1), 0);
+    std::string path = registry_.path() + "/" + key + ".sock";
+    struct stat st;
+    ASSERT_EQ(0, stat(path.c_str(), &st));
+    EXPECT_EQ(0600u, st.st_mode & 0777);
+    ASSERT_EQ(0, stat(registry_.path().c_str(), &st));
+    EXPECT_EQ(0u, st.st_mode & 077);
+
+    if (geteuid() != 0) {
+        if (getenv("CI") != nullptr && std::string(getenv("CI")) == "true") {
+            GTEST_FAIL() << "connecting as another user needs root";
+        }
+        GTEST_SKIP() << "connecting as another user needs root";
+    }
+    // Open the modes so that only the credential check stands in the way.
+    ASSERT_EQ(0, chmod(registry_.path().c_str(), 0755));
+    ASSERT_EQ(0, chmod(path.c_str(), 0666));
+    pid_t child = fork();
+    ASSERT_GE(child, 0);
+    if (child == 0) {
+        // Only async-signal-safe calls here.
+        if (setgid(65534) != 0 || setuid(65534) != 0) _exit(10);
+        sockaddr_un addr{};
+        addr.sun_family = AF_UNIX;
+        memcpy(addr.sun_path, path.c_str(), path.size() + 1);
+        int fd = socket(AF_UNIX, SOCK_STREAM, 0);
+        if (connect(fd, reinterpret_cast<sockaddr*>(&addr), sizeof(addr)) != 0) _exit(11);
+        char byte;
+        // Refused: the runtime closes the connection without a word.
+        ssize_t n = read(fd, &byte, 1);
+        _exit(n == 0 ? 0 : 12);
+    }
+    int status = -1;
+    ASSERT_EQ(child, waitpid(child, &status, 0));
+    ASSERT_TRUE(WIFEXITED(status));
+    EXPECT_EQ(0, WEXITSTATUS(status));
 }
 
 TEST_F(CrossProcessTest, MissingServicesAreNull) {
