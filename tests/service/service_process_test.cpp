@@ -6,6 +6,7 @@
 #include <android/binder_process.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/stat.h>
@@ -19,6 +20,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iostream>
+#include <optional>
 #include <sstream>
 #include <string>
 #include <thread>
@@ -105,6 +107,16 @@ class Child {
             return false;
         }
         return r == 0;
+    }
+
+    // Exit status of the child once it ends by itself within `timeout`, else -1.
+    int Wait(std::chrono::milliseconds timeout) {
+        const auto deadline = std::chrono::steady_clock::now() + timeout;
+        while (Running()) {
+            if (std::chrono::steady_clock::now() >= deadline) return -1;
+            std::this_thread::sleep_for(10ms);
+        }
+        return WIFEXITED(status_) ? WEXITSTATUS(status_) : -1;
     }
 
     // Sends `signal` and reaps the child; SIGKILL after 5 s.
@@ -303,6 +315,102 @@ TEST_F(ServiceProcessTest, RegistrationFailureLeavesAnUnreachableRunningProcess)
     ndk::SpAIBinder binder(AServiceManager_checkService(kServiceName));
     EXPECT_TRUE(binder.get() == nullptr || !AIBinder_isAlive(binder.get()));
 }
+
+#ifdef VYRCTL_BINARY
+// Reads lines from a file descriptor with a deadline.
+class LineSource {
+  public:
+    explicit LineSource(int fd) : fd_(fd) {}
+    ~LineSource() { close(fd_); }
+
+    std::optional<std::string> Next(std::chrono::milliseconds timeout) {
+        const auto deadline = std::chrono::steady_clock::now() + timeout;
+        while (true) {
+            const size_t newline = buffer_.find('\n');
+            if (newline != std::string::npos) {
+                std::string line = buffer_.substr(0, newline);
+                buffer_.erase(0, newline + 1);
+                return line;
+            }
+            const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
+                deadline - std::chrono::steady_clock::now());
+            if (left.count() <= 0) return std::nullopt;
+            pollfd pfd{fd_, POLLIN, 0};
+            if (poll(&pfd, 1, static_cast<int>(left.count())) <= 0) continue;
+            char chunk[256];
+            const ssize_t n = read(fd_, chunk, sizeof(chunk));
+            if (n <= 0) return std::nullopt;
+            buffer_.append(chunk, static_cast<size_t>(n));
+        }
+    }
+
+  private:
+    int fd_;
+    std::string buffer_;
+};
+
+TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
+    auto process = StartService();
+    ASSERT_NE(nullptr, WaitForRegistration(30s).get()) << "vyrservice never registered";
+
+    int to_shell[2];
+    int from_shell[2];
+    ASSERT_EQ(0, pipe2(to_shell, O_CLOEXEC));
+    ASSERT_EQ(0, pipe2(from_shell, O_CLOEXEC));
+    Child shell({VYRCTL_BINARY, "--timeout", "10", "shell"},
+                {"VYR_BINDER_DIR=" + g_work_dir + "/binder"}, dir_ + "/vyrctl.log", from_shell[1],
+                to_shell[0]);
+    close(to_shell[0]);
+    close(from_shell[1]);
+    LineSource output(from_shell[0]);
+    // One command in, one result line out.
+    auto run = [&](const std::string& command) -> std::string {
+        const std::string line = command + "\n";
+        EXPECT_EQ(static_cast<ssize_t>(line.size()), write(to_shell[1], line.data(), line.size()));
+        std::optional<std::string> result = output.Next(10s);
+        EXPECT_TRUE(result.has_value()) << command << "\n" << ReadFile(dir_ + "/vyrctl.log");
+        return result.value_or("");
+    };
+    auto handle_of = [](const std::string& result) {
+        const size_t arrow = result.find("-> ");
+        return arrow == std::string::npos ? 0 : std::atoi(result.c_str() + arrow + 3);
+    };
+
+    std::vector<int32_t> handles;
+    for (int i = 0; i < 10; ++i) {
+        const std::string mode = i < 5 ? "1" : "3";
+        const std::string result = run("open " + mode);
+        EXPECT_EQ(0u, result.rfind("open " + mode + " -> ", 0)) << result;
+        handles.push_back(handle_of(result));
+        EXPECT_GT(handles.back(), 0) << result;
+    }
+    EXPECT_EQ(0u, run("open 3").rfind("open 3 -> -1", 0));
+    EXPECT_EQ(0u, run("open 2").rfind("open 2 -> -22", 0));
+
+    const std::string als = std::to_string(handles[0]);
+    const std::string range = std::to_string(handles[5]);
+    EXPECT_EQ("enable " + als + " 100 -> 0", run("enable " + als + " 100"));
+    EXPECT_EQ("enable " + range + " 100 -> 0", run("enable " + range + " 100"));
+    EXPECT_EQ(0u, run("enable " + range + " 100").rfind("enable " + range + " 100 -> -17", 0));
+    EXPECT_EQ("disable " + als + " -> ok", run("disable " + als));
+    EXPECT_EQ("disable " + range + " -> ok", run("disable " + range));
+    for (int32_t handle : handles) {
+        const std::string h = std::to_string(handle);
+        EXPECT_EQ("close " + h + " -> ok", run("close " + h));
+    }
+    EXPECT_EQ(0u, run("enable " + range + " 100").rfind("enable " + range + " 100 -> -38", 0));
+    const std::string reopened = run("open 3");
+    EXPECT_GT(handle_of(reopened), 0) << reopened;
+    EXPECT_EQ("close " + std::to_string(handle_of(reopened)) + " -> ok",
+              run("close " + std::to_string(handle_of(reopened))));
+
+    const std::string quit = "quit\n";
+    EXPECT_EQ(static_cast<ssize_t>(quit.size()), write(to_shell[1], quit.data(), quit.size()));
+    close(to_shell[1]);
+    EXPECT_EQ(0, shell.Wait(10s));
+    EXPECT_TRUE(process->Running());
+}
+#endif
 
 // Child role: a client that enables range events with a callback set twice, reports its handle
 // on stdout and waits to be killed.
