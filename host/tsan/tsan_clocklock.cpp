@@ -1,3 +1,5 @@
+// Linked into every program of a TSan build (see the top-level CMakeLists.txt).
+//
 // ThreadSanitizer (GCC 12 and clang 14) does not intercept pthread_mutex_clocklock, which
 // libstdc++'s std::timed_mutex uses for try_lock_for: it then sees the unlock of a mutex it never
 // saw locked and misses the happens-before edges. Programs of a TSan build get this definition
@@ -40,3 +42,19 @@ extern "C" int pthread_mutex_clocklock(pthread_mutex_t* mutex, clockid_t clock,
     }
     return pthread_mutex_timedlock(mutex, &deadline);
 }
+
+namespace {
+
+// ThreadSanitizer starts a background thread of its own at the first thread creation and keeps
+// it. Tests that count the process's threads take their baseline before starting any, so the
+// sanitizer's thread is started here, before main, where it cannot skew a count.
+[[maybe_unused]] const bool kBackgroundThreadStarted = [] {
+    pthread_t thread;
+    if (pthread_create(
+            &thread, nullptr, [](void*) -> void* { return nullptr; }, nullptr) == 0) {
+        pthread_join(thread, nullptr);
+    }
+    return true;
+}();
+
+}  // namespace
