@@ -104,6 +104,7 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     std::unordered_map<int32_t, ClientEntry> clients_;
     // -1 is never a handle, so the draw for the display handle itself excludes nothing else.
     int32_t display_handle_ = -1;
+    // Read and written by nothing; kept so that the object keeps the deployed layout.
     std::string reserved_;
     std::atomic<bool> low_power_{false};
     std::thread display_thread_;

@@ -127,6 +127,21 @@ TEST_F(OpenCloseTest, CloseOfEnabledClientEndsNotificationButKeepsEnableCount) {
     EXPECT_EQ(0u, sensor_doubles::CountOf(sensor_doubles::kRangeUninit));
 }
 
+TEST_F(OpenCloseTest, EmptyCallbackIsRefused) {
+    MakeService(false, true);
+    const int32_t handle = Open(3);
+    int32_t result = 0;
+    EXPECT_TRUE(service_->SetCallback(handle, nullptr, &result).isOk());
+    EXPECT_EQ(-22, result);
+    EXPECT_EQ(1u, log_.Count(kTag, ANDROID_LOG_ERROR, "SetCallback null callback"));
+    // Still a polling client: enabling starts the processing thread and no notification thread.
+    ASSERT_EQ(0, Enable(handle, 100));
+    ASSERT_TRUE(WaitForWorkLog("EnableWork", handle));
+    impl_->SnapshotModeBlock(BlockOf(3));
+    EXPECT_EQ(baseline_threads_ + 2, ThreadCount());
+    DisableAndWait(handle);
+}
+
 TEST_F(OpenCloseTest, FailedCallsStillReturnOkStatus) {
     MakeService(/*als=*/false, /*range=*/true);
     int32_t result = 0;
