@@ -55,8 +55,8 @@ bool ServiceProcess::Start(const std::string& binary) {
     std::map<std::string, std::string> env = ClientEnvironment();
     env["VYR_PROPERTY_FILE"] = dir_ + "/build.prop";
     env["VYR_SENSOR_STATE_FILE"] = dir_ + "/sensor_state";
-    process_ = std::make_unique<ChildProcess>(std::vector<std::string>{binary}, env,
-                                              dir_ + "/vyrservice.log");
+    process_ = std::make_unique<vyr_test::ChildProcess>(std::vector<std::string>{binary}, env,
+                                                        dir_ + "/vyrservice.log");
     return process_->started();
 }
 

@@ -43,7 +43,7 @@ class ServiceProcess {
 
   private:
     std::string dir_;
-    std::unique_ptr<ChildProcess> process_;
+    std::unique_ptr<vyr_test::ChildProcess> process_;
 };
 
 }  // namespace vyr_datapath

@@ -5,6 +5,7 @@
 
 #include <cstdlib>
 #include <fstream>
+#include <map>
 #include <memory>
 #include <string>
 #include <thread>
@@ -62,8 +63,8 @@ class SandboxTest : public ::testing::Test {
               std::string("/bin/sh"), std::string("-c"), script}) {
             argv.push_back(arg);
         }
-        sandbox_ =
-            std::make_unique<ChildProcess>(argv, std::vector<std::string>{}, dir_ + "/output");
+        sandbox_ = std::make_unique<vyr_test::ChildProcess>(
+            argv, std::map<std::string, std::string>{}, dir_ + "/output", kWait);
         const auto line = sandbox_->ReadLine(kWait);
         return line && line->rfind("pid ", 0) == 0;
     }
@@ -71,7 +72,7 @@ class SandboxTest : public ::testing::Test {
     std::string Output() { return ReadFile(dir_ + "/output"); }
 
     std::string dir_;
-    std::unique_ptr<ChildProcess> sandbox_;
+    std::unique_ptr<vyr_test::ChildProcess> sandbox_;
 };
 
 TEST_F(SandboxTest, DevicePathsShowWhatTheCallerControls) {

@@ -56,7 +56,7 @@ SandboxedService::SandboxedService(const Options& options) {
     WriteFile(dir_ + "/apex-info-list.xml", options.apex_list);
 
     started_at_ = std::chrono::steady_clock::now();
-    sandbox_ = std::make_unique<ChildProcess>(
+    sandbox_ = std::make_unique<vyr_test::ChildProcess>(
         std::vector<std::string>{VYR_SANDBOX_PATH, "run", "--panel", options.panel, "--apex",
                                  dir_ + "/apex-info-list.xml", "--props", dir_ + "/build.prop",
                                  "--", VYRSERVICE_PATH},
@@ -93,8 +93,8 @@ SandboxedService::~SandboxedService() {
     }
 }
 
-std::vector<std::string> SandboxedService::ClientEnvironment() const {
-    return {"VYR_BINDER_DIR=" + dir_ + "/binder", "VYR_SENSOR_STATE_FILE=" + dir_ + "/sensors"};
+std::map<std::string, std::string> SandboxedService::ClientEnvironment() const {
+    return {{"VYR_BINDER_DIR", dir_ + "/binder"}, {"VYR_SENSOR_STATE_FILE", dir_ + "/sensors"}};
 }
 
 bool SandboxedService::Panel(const std::string& state) {

@@ -33,7 +33,7 @@ class SandboxedService {
     std::chrono::steady_clock::time_point started_at() const { return started_at_; }
     pid_t service_pid() const { return service_pid_; }
     // Environment entries that let a client reach this service.
-    std::vector<std::string> ClientEnvironment() const;
+    std::map<std::string, std::string> ClientEnvironment() const;
     const std::string& dir() const { return dir_; }
 
     bool Panel(const std::string& state);
@@ -59,7 +59,7 @@ class SandboxedService {
   private:
     std::string dir_;
     std::string problem_;
-    std::unique_ptr<ChildProcess> sandbox_;
+    std::unique_ptr<vyr_test::ChildProcess> sandbox_;
     pid_t service_pid_ = -1;
     std::chrono::steady_clock::time_point started_at_;
     std::optional<int> exit_status_;

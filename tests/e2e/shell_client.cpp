@@ -10,13 +10,16 @@ using namespace std::chrono_literals;
 // vyrctl waits this long for the service to register before it gives up.
 constexpr char kConnectTimeoutSeconds[] = "20";
 constexpr auto kResultTimeout = 25s;
+constexpr auto kExitGrace = 10s;
 
 }  // namespace
 
-ShellClient::ShellClient(const std::vector<std::string>& env, const std::string& stderr_path)
-    : process_(std::make_unique<ChildProcess>(
+ShellClient::ShellClient(const std::map<std::string, std::string>& env,
+                         const std::string& stderr_path)
+    // Given time to end on end of input, as a user's shell would.
+    : process_(std::make_unique<vyr_test::ChildProcess>(
           std::vector<std::string>{VYRCTL_PATH, "--timeout", kConnectTimeoutSeconds, "shell"}, env,
-          stderr_path)) {}
+          stderr_path, kExitGrace)) {}
 
 std::optional<int64_t> ShellClient::Call(const std::string& command) {
     if (!process_->WriteLine(command)) return std::nullopt;

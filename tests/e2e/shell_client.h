@@ -1,6 +1,7 @@
 #pragma once
 
 #include <chrono>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -13,16 +14,16 @@ namespace vyr_e2e {
 // A `vyrctl shell` client process: one command line in, one "<command> -> <result>" line out.
 class ShellClient {
   public:
-    ShellClient(const std::vector<std::string>& env, const std::string& stderr_path);
+    ShellClient(const std::map<std::string, std::string>& env, const std::string& stderr_path);
 
     // The leading number of the command's result, or nothing when no result line came.
     std::optional<int64_t> Call(const std::string& command);
     // Repeats `command` until its result is `expected`; false on time-out.
     bool CallUntil(const std::string& command, int64_t expected, std::chrono::milliseconds timeout);
-    ChildProcess& process() { return *process_; }
+    vyr_test::ChildProcess& process() { return *process_; }
 
   private:
-    std::unique_ptr<ChildProcess> process_;
+    std::unique_ptr<vyr_test::ChildProcess> process_;
 };
 
 }  // namespace vyr_e2e

@@ -6,7 +6,6 @@
 #include <android/binder_process.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
-#include <poll.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/stat.h>
@@ -25,6 +24,8 @@
 #include <string>
 #include <thread>
 #include <vector>
+
+#include "child_process.h"
 
 extern char** environ;
 
@@ -317,57 +318,17 @@ TEST_F(ServiceProcessTest, RegistrationFailureLeavesAnUnreachableRunningProcess)
 }
 
 #ifdef VYRCTL_BINARY
-// Reads lines from a file descriptor with a deadline.
-class LineSource {
-  public:
-    explicit LineSource(int fd) : fd_(fd) {}
-    ~LineSource() { close(fd_); }
-
-    std::optional<std::string> Next(std::chrono::milliseconds timeout) {
-        const auto deadline = std::chrono::steady_clock::now() + timeout;
-        while (true) {
-            const size_t newline = buffer_.find('\n');
-            if (newline != std::string::npos) {
-                std::string line = buffer_.substr(0, newline);
-                buffer_.erase(0, newline + 1);
-                return line;
-            }
-            const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
-                deadline - std::chrono::steady_clock::now());
-            if (left.count() <= 0) return std::nullopt;
-            pollfd pfd{fd_, POLLIN, 0};
-            if (poll(&pfd, 1, static_cast<int>(left.count())) <= 0) continue;
-            char chunk[256];
-            const ssize_t n = read(fd_, chunk, sizeof(chunk));
-            if (n <= 0) return std::nullopt;
-            buffer_.append(chunk, static_cast<size_t>(n));
-        }
-    }
-
-  private:
-    int fd_;
-    std::string buffer_;
-};
-
 TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
     auto process = StartService();
     ASSERT_NE(nullptr, WaitForRegistration(30s).get()) << "vyrservice never registered";
 
-    int to_shell[2];
-    int from_shell[2];
-    ASSERT_EQ(0, pipe2(to_shell, O_CLOEXEC));
-    ASSERT_EQ(0, pipe2(from_shell, O_CLOEXEC));
-    Child shell({VYRCTL_BINARY, "--timeout", "10", "shell"},
-                {"VYR_BINDER_DIR=" + g_work_dir + "/binder"}, dir_ + "/vyrctl.log", from_shell[1],
-                to_shell[0]);
-    close(to_shell[0]);
-    close(from_shell[1]);
-    LineSource output(from_shell[0]);
+    vyr_test::ChildProcess shell({VYRCTL_BINARY, "--timeout", "10", "shell"},
+                                 {{"VYR_BINDER_DIR", g_work_dir + "/binder"}}, dir_ + "/vyrctl.log");
+    ASSERT_TRUE(shell.started());
     // One command in, one result line out.
     auto run = [&](const std::string& command) -> std::string {
-        const std::string line = command + "\n";
-        EXPECT_EQ(static_cast<ssize_t>(line.size()), write(to_shell[1], line.data(), line.size()));
-        std::optional<std::string> result = output.Next(10s);
+        EXPECT_TRUE(shell.WriteLine(command));
+        std::optional<std::string> result = shell.ReadLine(10s);
         EXPECT_TRUE(result.has_value()) << command << "\n" << ReadFile(dir_ + "/vyrctl.log");
         return result.value_or("");
     };
@@ -404,10 +365,10 @@ TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
     EXPECT_EQ("close " + std::to_string(handle_of(reopened)) + " -> ok",
               run("close " + std::to_string(handle_of(reopened))));
 
-    const std::string quit = "quit\n";
-    EXPECT_EQ(static_cast<ssize_t>(quit.size()), write(to_shell[1], quit.data(), quit.size()));
-    close(to_shell[1]);
-    EXPECT_EQ(0, shell.Wait(10s));
+    EXPECT_TRUE(shell.WriteLine("quit"));
+    shell.CloseStdin();
+    // Wait status 0: it exited by itself with status 0.
+    EXPECT_EQ(std::optional<int>(0), shell.Wait(10s));
     EXPECT_TRUE(process->Running());
 }
 #endif

@@ -11,14 +11,17 @@
 #include <string>
 #include <vector>
 
-namespace vyr_datapath {
+namespace vyr_test {
 
 class ChildProcess {
   public:
     // Starts `argv` with the test's environment plus `env`; stderr goes to `stderr_path`.
+    // `exit_grace` is how long the destructor lets the child end by itself once its stdin is
+    // closed before it kills it.
     ChildProcess(const std::vector<std::string>& argv,
-                 const std::map<std::string, std::string>& env, const std::string& stderr_path);
-    // Kills (SIGKILL) and reaps the child if it still runs.
+                 const std::map<std::string, std::string>& env, const std::string& stderr_path,
+                 std::chrono::milliseconds exit_grace = std::chrono::milliseconds(0));
+    // Closes stdin, then kills (SIGKILL) and reaps the child if it still runs after the grace.
     ~ChildProcess();
     ChildProcess(const ChildProcess&) = delete;
     ChildProcess& operator=(const ChildProcess&) = delete;
@@ -41,6 +44,7 @@ class ChildProcess {
     bool Running();
 
   private:
+    std::chrono::milliseconds exit_grace_;
     pid_t pid_ = -1;
     int stdin_fd_ = -1;
     int stdout_fd_ = -1;
@@ -48,4 +52,4 @@ class ChildProcess {
     std::optional<int> status_;
 };
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test

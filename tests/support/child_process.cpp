@@ -13,14 +13,17 @@
 
 extern char** environ;
 
-namespace vyr_datapath {
+namespace vyr_test {
 
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 
 ChildProcess::ChildProcess(const std::vector<std::string>& argv,
                            const std::map<std::string, std::string>& env,
-                           const std::string& stderr_path) {
+                           const std::string& stderr_path, milliseconds exit_grace)
+    : exit_grace_(exit_grace) {
+    // A child that has gone must show up as a failed write, not kill the test with SIGPIPE.
+    signal(SIGPIPE, SIG_IGN);
     std::map<std::string, std::string> merged;
     for (char** e = environ; *e != nullptr; ++e) {
         const char* eq = strchr(*e, '=');
@@ -67,19 +70,17 @@ ChildProcess::ChildProcess(const std::vector<std::string>& argv,
 }
 
 ChildProcess::~ChildProcess() {
-    if (pid_ > 0 && !status_) {
-        kill(pid_, SIGKILL);
+    CloseStdin();
+    if (pid_ > 0 && !Wait(exit_grace_)) {
+        Signal(SIGKILL);
         Wait(milliseconds(10000));
     }
-    CloseStdin();
     if (stdout_fd_ >= 0) close(stdout_fd_);
 }
 
 bool ChildProcess::WriteLine(const std::string& line) {
     if (stdin_fd_ < 0) return false;
     std::string text = line + "\n";
-    // A child that has gone must not kill the test with SIGPIPE.
-    signal(SIGPIPE, SIG_IGN);
     return write(stdin_fd_, text.data(), text.size()) == static_cast<ssize_t>(text.size());
 }
 
@@ -153,4 +154,4 @@ bool ChildProcess::Running() {
     return pid_ > 0 && !Wait(milliseconds(0));
 }
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test
