@@ -31,21 +31,6 @@ bool WaitUntil(const std::function<bool()>& condition, std::chrono::milliseconds
     return true;
 }
 
-size_t CountWork(const std::vector<vyr_test::LogRecord>& records, const std::string& work,
-                 int32_t handle) {
-    // EnableWork prints "handle:%x sampling", DisableWork "handle:%x, active_period".
-    const std::string needle = "handle:" + Hex(handle) + (work == "EnableWork" ? " " : ",");
-    size_t count = 0;
-    for (const auto& record : records) {
-        if (record.tag == kTag && record.priority == ANDROID_LOG_INFO &&
-            record.message.rfind(work + " ", 0) == 0 &&
-            record.message.find(needle) != std::string::npos) {
-            ++count;
-        }
-    }
-    return count;
-}
-
 // The descriptor on which the display monitor watches the attribute (the test itself never keeps
 // one open), or -1.
 int MonitorDescriptor() {
@@ -63,27 +48,6 @@ int MonitorDescriptor() {
 }
 
 }  // namespace
-
-std::string Hex(int32_t value) {
-    char text[16];
-    snprintf(text, sizeof(text), "%x", static_cast<unsigned>(value));
-    return text;
-}
-
-size_t ThreadCount() {
-    size_t count = 0;
-    DIR* dir = opendir("/proc/self/task");
-    if (dir == nullptr) return 0;
-    while (dirent* entry = readdir(dir)) {
-        if (entry->d_name[0] != '.') ++count;
-    }
-    closedir(dir);
-    return count;
-}
-
-bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
-    return WaitUntil([count] { return ThreadCount() == count; }, timeout);
-}
 
 void DisplayTest::SetUp() {
     if (!HaveOwnUtsNamespace()) {
@@ -226,13 +190,13 @@ bool DisplayTest::NotifyUntil(const std::function<bool()>& done, std::chrono::mi
 }
 
 size_t DisplayTest::WorkLines(const std::string& work, int32_t handle) {
-    return CountWork(log_.Records(), work, handle);
+    return vyr_test::CountWorkLogs(log_.Records(), work, handle);
 }
 
 bool DisplayTest::WaitForWorkLines(const std::string& work, int32_t handle, size_t count) {
     return log_.WaitUntil(
         [&](const std::vector<vyr_test::LogRecord>& records) {
-            return CountWork(records, work, handle) >= count;
+            return vyr_test::CountWorkLogs(records, work, handle) >= count;
         },
         kWait);
 }

@@ -14,7 +14,9 @@
 #include "fuse_attribute.h"
 #include "log_capture.h"
 #include "sensor_doubles.h"
+#include "thread_count.h"
 #include "vyrservice.h"
+#include "work_log.h"
 
 namespace vyr_display_test {
 
@@ -30,9 +32,9 @@ inline constexpr char kStatePath[] = "/proc/sys/kernel/hostname";
 inline constexpr int32_t kAlsBlock = 0;
 inline constexpr int32_t kRangeBlock = 2;
 
-std::string Hex(int32_t value);
-size_t ThreadCount();
-bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout);
+using vyr_test::Hex;
+using vyr_test::ThreadCount;
+using vyr_test::WaitForThreadCount;
 
 // Builds the service on the sensor doubles with the display monitor watching the hostname
 // attribute, and drives the "panel" through sethostname(). Needs a UTS namespace of its own

@@ -1,36 +1,8 @@
 #include "service_test_fixture.h"
 
-#include <dirent.h>
-
 #include <thread>
 
 namespace vyr_service_test {
-
-size_t ThreadCount() {
-    size_t count = 0;
-    DIR* dir = opendir("/proc/self/task");
-    if (dir == nullptr) return 0;
-    while (dirent* entry = readdir(dir)) {
-        if (entry->d_name[0] != '.') ++count;
-    }
-    closedir(dir);
-    return count;
-}
-
-bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
-    const auto deadline = std::chrono::steady_clock::now() + timeout;
-    while (ThreadCount() != count) {
-        if (std::chrono::steady_clock::now() >= deadline) return false;
-        std::this_thread::sleep_for(5ms);
-    }
-    return true;
-}
-
-std::string Hex(int32_t value) {
-    char text[16];
-    snprintf(text, sizeof(text), "%x", static_cast<unsigned>(value));
-    return text;
-}
 
 ndk::ScopedAStatus RecordingCallback::OnEvent(const Event& event) {
     std::lock_guard<std::mutex> lock(mutex_);
@@ -126,34 +98,14 @@ void ServiceTest::DisableAndWait(int32_t handle) {
     impl_->SnapshotModeBlock(BlockOf(modes_[handle]));
 }
 
-namespace {
-
-bool IsWorkLog(const vyr_test::LogRecord& record, const std::string& work, int32_t handle) {
-    return record.tag == kTag && record.priority == ANDROID_LOG_INFO &&
-           record.message.rfind(work + " ", 0) == 0 &&
-           record.message.find("handle:" + Hex(handle) + (work == "EnableWork" ? " " : ",")) !=
-               std::string::npos;
-}
-
-size_t CountWorkLogs(const std::vector<vyr_test::LogRecord>& records, const std::string& work,
-                     int32_t handle) {
-    size_t count = 0;
-    for (const auto& record : records) {
-        if (IsWorkLog(record, work, handle)) ++count;
-    }
-    return count;
-}
-
-}  // namespace
-
 size_t ServiceTest::WorkLogCount(const std::string& work, int32_t handle) {
-    return CountWorkLogs(log_.Records(), work, handle);
+    return vyr_test::CountWorkLogs(log_.Records(), work, handle);
 }
 
 bool ServiceTest::WaitForWorkLog(const std::string& work, int32_t handle, size_t count) {
     return log_.WaitUntil(
         [&](const std::vector<vyr_test::LogRecord>& records) {
-            return CountWorkLogs(records, work, handle) >= count;
+            return vyr_test::CountWorkLogs(records, work, handle) >= count;
         },
         kWait);
 }

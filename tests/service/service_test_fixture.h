@@ -15,7 +15,9 @@
 
 #include "log_capture.h"
 #include "sensor_doubles.h"
+#include "thread_count.h"
 #include "vyrservice.h"
+#include "work_log.h"
 
 namespace vyr_service_test {
 
@@ -33,12 +35,9 @@ inline constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_suppor
 inline constexpr char kNoDisplayPath[] = "/nonexistent/vyr-service-test/display-state";
 inline constexpr auto kWait = 10s;
 
-// Number of threads of this process.
-size_t ThreadCount();
-// Waits until the process has `count` threads; false on time-out.
-bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout);
-
-std::string Hex(int32_t value);
+using vyr_test::Hex;
+using vyr_test::ThreadCount;
+using vyr_test::WaitForThreadCount;
 
 // An in-process callback that records what it receives.
 class RecordingCallback : public aidl::android::vyr::BnEventCallback {

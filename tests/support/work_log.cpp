@@ -1,0 +1,30 @@
+#include "work_log.h"
+
+#include <android/log.h>
+
+#include <cstdio>
+
+namespace vyr_test {
+
+std::string Hex(int32_t value) {
+    char text[16];
+    snprintf(text, sizeof(text), "%x", static_cast<unsigned>(value));
+    return text;
+}
+
+size_t CountWorkLogs(const std::vector<LogRecord>& records, const std::string& work,
+                     int32_t handle) {
+    // EnableWork prints "handle:%x sampling", DisableWork "handle:%x, active_period".
+    const std::string needle = "handle:" + Hex(handle) + (work == "EnableWork" ? " " : ",");
+    size_t count = 0;
+    for (const auto& record : records) {
+        if (record.tag == "vyrservice" && record.priority == ANDROID_LOG_INFO &&
+            record.message.rfind(work + " ", 0) == 0 &&
+            record.message.find(needle) != std::string::npos) {
+            ++count;
+        }
+    }
+    return count;
+}
+
+}  // namespace vyr_test

@@ -1,0 +1,19 @@
+#pragma once
+
+// The service worker's "EnableWork"/"DisableWork" log lines, matched per client handle.
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "log_capture.h"
+
+namespace vyr_test {
+
+// Lower-case hexadecimal, as the service prints handles.
+std::string Hex(int32_t value);
+// Number of INFO records of tag "vyrservice" that are the worker's `work` line for `handle`.
+size_t CountWorkLogs(const std::vector<LogRecord>& records, const std::string& work, int32_t handle);
+
+}  // namespace vyr_test
