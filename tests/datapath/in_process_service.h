@@ -20,6 +20,8 @@
 
 namespace vyr_datapath {
 
+using vyr_test::RecordingCallback;
+
 constexpr int32_t kAls = 1;
 constexpr int32_t kRange = 3;
 constexpr char kTag[] = "vyrservice";

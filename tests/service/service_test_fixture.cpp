@@ -4,23 +4,6 @@
 
 namespace vyr_service_test {
 
-ndk::ScopedAStatus RecordingCallback::OnEvent(const Event& event) {
-    std::lock_guard<std::mutex> lock(mutex_);
-    events_.push_back(event);
-    changed_.notify_all();
-    return ndk::ScopedAStatus::ok();
-}
-
-size_t RecordingCallback::Count() {
-    std::lock_guard<std::mutex> lock(mutex_);
-    return events_.size();
-}
-
-bool RecordingCallback::WaitForCount(size_t count, std::chrono::milliseconds timeout) {
-    std::unique_lock<std::mutex> lock(mutex_);
-    return changed_.wait_for(lock, timeout, [&] { return events_.size() >= count; });
-}
-
 void ServiceTest::SetUp() {
     sensor_doubles::Reset();
     // Sanitizer runtimes start a helper thread on the first thread creation; count it in.

@@ -1,19 +1,17 @@
 #pragma once
 
-#include <aidl/android/vyr/BnEventCallback.h>
 #include <aidl/android/vyr/IVYRService.h>
 #include <android/log.h>
 #include <gtest/gtest.h>
 
 #include <chrono>
-#include <condition_variable>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <vector>
 
 #include "log_capture.h"
+#include "recording_callback.h"
 #include "sensor_doubles.h"
 #include "thread_count.h"
 #include "vyrservice.h"
@@ -36,21 +34,9 @@ inline constexpr char kNoDisplayPath[] = "/nonexistent/vyr-service-test/display-
 inline constexpr auto kWait = 10s;
 
 using vyr_test::Hex;
+using vyr_test::RecordingCallback;
 using vyr_test::ThreadCount;
 using vyr_test::WaitForThreadCount;
-
-// An in-process callback that records what it receives.
-class RecordingCallback : public aidl::android::vyr::BnEventCallback {
-  public:
-    ndk::ScopedAStatus OnEvent(const Event& event) override;
-    size_t Count();
-    bool WaitForCount(size_t count, std::chrono::milliseconds timeout);
-
-  private:
-    std::mutex mutex_;
-    std::condition_variable changed_;
-    std::vector<Event> events_;
-};
 
 // Builds the service on the sensor doubles with a scripted property source and no start-up
 // delay. Checks at the end of each test that no thread of the service is left.

@@ -10,7 +10,7 @@
 #include <mutex>
 #include <vector>
 
-namespace vyr_datapath {
+namespace vyr_test {
 
 class RecordingCallback : public aidl::android::vyr::BnEventCallback {
   public:
@@ -30,4 +30,4 @@ class RecordingCallback : public aidl::android::vyr::BnEventCallback {
     std::atomic<bool> failing_{false};
 };
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test

@@ -2,7 +2,7 @@
 
 #include <android/binder_status.h>
 
-namespace vyr_datapath {
+namespace vyr_test {
 
 ndk::ScopedAStatus RecordingCallback::OnEvent(const aidl::android::vyr::Event& event) {
     {
@@ -29,4 +29,4 @@ bool RecordingCallback::WaitForEvents(size_t count, std::chrono::milliseconds ti
     return changed_.wait_for(lock, timeout, [&] { return events_.size() >= count; });
 }
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test
