@@ -1,5 +1,6 @@
 #include "one_shot_commands.h"
 
+#include "call_check.h"
 #include "options.h"
 #include "result_text.h"
 
@@ -10,14 +11,7 @@ int RunConfigure(const Connection& connection, const std::vector<int32_t>& value
     const auto& service = connection.service();
     int32_t handle = 0;
     ndk::ScopedAStatus status = service->Open(kModeRange, &handle);
-    if (!status.isOk()) {
-        err->WriteLine("error: open range: " + DescribeStatus(status));
-        return 1;
-    }
-    if (handle < 0) {
-        err->WriteLine("error: open range -> " + DescribeResult(handle));
-        return 1;
-    }
+    if (!CheckCall(status, handle, "open range", err)) return 1;
     int32_t result = 0;
     status = service->ConfigureParameters(handle, values, &result);
     service->Close(handle);

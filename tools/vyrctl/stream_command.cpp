@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "call_check.h"
 #include "event_format.h"
 #include "event_queue.h"
 #include "forwarding_callback.h"
@@ -19,20 +20,6 @@ namespace {
 
 constexpr milliseconds kWaitSlice{50};
 
-// Prints "<what> failed: ..." for a refused or failed call; true when the call succeeded.
-bool Check(const ndk::ScopedAStatus& status, int32_t result, const std::string& what,
-           LineWriter* err) {
-    if (!status.isOk()) {
-        err->WriteLine("error: " + what + ": " + DescribeStatus(status));
-        return false;
-    }
-    if (result < 0) {
-        err->WriteLine("error: " + what + " -> " + DescribeResult(result));
-        return false;
-    }
-    return true;
-}
-
 class Stream {
   public:
     Stream(const Connection& connection, const StreamOptions& options, LineWriter* out,
@@ -48,7 +35,7 @@ class Stream {
         int32_t result = 0;
         // Each call runs before its result is read: argument order is unspecified.
         ndk::ScopedAStatus status = service_->Open(options_.mode, &result);
-        if (!Check(status, result, what, err_)) return 1;
+        if (!CheckCall(status, result, what, err_)) return 1;
         handle_ = result;
         int exit_status = Setup() ? Loop() : 1;
         Teardown();
@@ -74,12 +61,12 @@ class Stream {
             callback_ = ndk::SharedRefBase::make<ForwardingCallback>(
                 [queue](const Event& event) { queue->Push(event); });
             ndk::ScopedAStatus status = service_->SetCallback(handle_, callback_, &result);
-            if (!Check(status, result, "callback", err_)) {
+            if (!CheckCall(status, result, "callback", err_)) {
                 return false;
             }
         }
         ndk::ScopedAStatus status = service_->Enable(handle_, options_.period_ms, &result);
-        if (!Check(status, result, "enable", err_)) {
+        if (!CheckCall(status, result, "enable", err_)) {
             return false;
         }
         enabled_ = true;
