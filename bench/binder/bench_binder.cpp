@@ -36,8 +36,10 @@ using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 using aidl::android::vyr::IVYRService;
 
-// Bytes on the wire of one Enable(handle, period) call and of its reply, frame headers included.
-constexpr size_t kRequestBytes = 56 + 48;
+// Bytes on the wire of one Enable(handle, period) call and of its reply, frame headers included:
+// the call carries the interface token (marker, length, "android.vyr.IVYRService" padded to 24)
+// and two int32 arguments; the reply a status and one int32.
+constexpr size_t kRequestBytes = 56 + 40;
 constexpr size_t kReplyBytes = 56 + 8;
 
 class BenchService : public BnVYRService {
