@@ -10,6 +10,9 @@ VYR_DEBIAN_PACKAGES=(
     g++
     git
     aidl
+    # Checks of the device build files (scripts/check-device)
+    blueprint-tools
+    python3
     # Platform libraries the service is written against
     android-liblog-dev
     android-libbase-dev

@@ -18,7 +18,11 @@ void ClientEntry::Disable() {
         notify_cv->notify_all();
     }
     if (notify_thread && notify_thread->joinable()) {
-        notify_thread->join();
+        if (notify_thread->get_id() == std::this_thread::get_id()) {
+            notify_thread->detach();
+        } else {
+            notify_thread->join();
+        }
     }
     notify_thread.reset();
     notify_cv.reset();

@@ -3,6 +3,7 @@
 #include <aidl/android/vyr/IEventCallback.h>
 #include <android/binder_auto_utils.h>
 #include <android/binder_ibinder.h>
+#include <sys/types.h>
 
 #include <atomic>
 #include <condition_variable>
@@ -29,6 +30,8 @@ struct ClientEntry {
     ClientEntry& operator=(const ClientEntry&) = delete;
 
     // Marks the client disabled and stops its notification thread, waking it out of its sleep.
+    // Called on that thread itself (a nested call from the client's OnEvent), it lets the thread
+    // go instead of joining it: the thread ends when OnEvent returns, holding the entry until then.
     void Disable();
 
     const int32_t mode;
@@ -37,6 +40,9 @@ struct ClientEntry {
     // 1 = enabled, 0 = disabled; the notification thread polls it without a lock.
     std::atomic<int32_t> state{0};
     std::unique_ptr<std::thread> notify_thread;
+    // Raised by each Enable; a notification thread runs only while it matches the value it was
+    // started with, so one let go by a nested Disable ends although a nested Enable followed.
+    std::atomic<uint64_t> notify_generation{0};
     std::unique_ptr<std::condition_variable> notify_cv;
     std::unique_ptr<std::mutex> notify_mutex;
     // Held strongly: an in-process callback keeps only a weak reference to its own binder.
@@ -45,6 +51,9 @@ struct ClientEntry {
     // Owned by the service, which keeps every cookie for as long as a link made with it can
     // fire, also after this entry is gone.
     const DeathCookie* death_cookie = nullptr;
+    // The process that opened the handle, when it is not the service's own; watched so that its
+    // end closes the handle even without a callback to link to.
+    pid_t opener_pid = 0;
 };
 
 }  // namespace binder

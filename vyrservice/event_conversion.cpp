@@ -9,7 +9,7 @@ namespace binder {
 using aidl::android::vyr::Event;
 
 void ConvertAlsResult(const ALSResult& result, Event* event) {
-    event->status = static_cast<int8_t>(result.status);
+    event->status = static_cast<uint8_t>(result.status);
     event->timestamp = result.timestamp_ns;
     event->value0 = result.color_temperature;
     event->value1 = result.lux;

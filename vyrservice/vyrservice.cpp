@@ -77,7 +77,9 @@ std::chrono::system_clock::time_point SystemDeadline(std::chrono::steady_clock::
 
 }  // namespace
 
-VYRService::VYRService(const ServiceConfig& config) {
+VYRService::VYRService(const ServiceConfig& config)
+    : process_watcher_(std::make_unique<ClientProcessWatcher>(
+          [this](pid_t pid) { HandleClientProcessExit(pid); })) {
     display_handle_ = NewHandle();
     std::this_thread::sleep_for(config.startup_delay);
     worker_threads_.reserve(2);
@@ -114,6 +116,8 @@ VYRService::VYRService(const ServiceConfig& config) {
 }
 
 VYRService::~VYRService() {
+    // First, so that no process exit reaches a service that is going away.
+    process_watcher_.reset();
     running_ = false;
     if (display_thread_.joinable()) {
         display_thread_.join();
@@ -130,6 +134,24 @@ VYRService::~VYRService() {
     }
     AmbientLightSensor::Destroy();
     ubk::RangeSensor::Destroy();
+
+    // A notification thread holds its entry, so dropping the table would not stop it: each
+    // client is released here, its thread joined before its callback goes.
+    for (auto& [handle, entry] : clients_) {
+        entry->Disable();
+        entry->callback.reset();
+    }
+
+    // Deleting a recipient unlinks what is still linked; nothing may report that to this object
+    // any more.
+    std::unordered_map<const DeathCookie*, std::unique_ptr<DeathLink>> links;
+    {
+        std::lock_guard<std::mutex> lock(links_mutex_);
+        links.swap(death_links_);
+    }
+    for (auto& [cookie, link] : links) {
+        AIBinder_DeathRecipient_setOnUnlinked(link->recipient.get(), nullptr);
+    }
 }
 
 int32_t VYRService::NewHandle() {
@@ -172,6 +194,11 @@ void VYRService::PushWorkItem(const WorkItem& item) {
     QueueForMode(item.mode).PushAndSignal(item);
 }
 
+size_t VYRService::DeathLinkCount() {
+    std::lock_guard<std::mutex> lock(links_mutex_);
+    return death_links_.size();
+}
+
 // Client table.
 
 ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {
@@ -190,8 +217,12 @@ ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {
         *result = -ENODEV;
     } else {
         const int32_t handle = NewHandle();
-        clients_.emplace(std::piecewise_construct, std::forward_as_tuple(handle),
-                         std::forward_as_tuple(mode));
+        auto entry = std::make_shared<ClientEntry>(mode);
+        const pid_t caller = AIBinder_getCallingPid();
+        if (caller > 0 && caller != getpid() && process_watcher_->Watch(caller)) {
+            entry->opener_pid = caller;
+        }
+        clients_.emplace(handle, std::move(entry));
         ++num_clients_;
         *result = handle;
     }
@@ -209,9 +240,21 @@ void VYRService::CloseInternal(int32_t handle) {
     if (it == clients_.end()) {
         return;
     }
-    // The entry's destructor stops its notification thread before the callback is dropped.
+    std::shared_ptr<ClientEntry> entry = std::move(it->second);
     clients_.erase(it);
     --num_clients_;
+    UnlinkDeath(entry.get());
+    // The notification thread stops before the callback is dropped; one that is running this
+    // very call (from OnEvent) keeps the entry until it has ended.
+    entry->Disable();
+    entry->callback.reset();
+    const pid_t opener = entry->opener_pid;
+    if (opener != 0 && std::none_of(clients_.begin(), clients_.end(), [opener](const auto& client) {
+            return client.second->opener_pid == opener;
+        })) {
+        process_watcher_->Unwatch(opener);
+    }
+    SweepDeathLinks();
 }
 
 // Enable, disable and low power.
@@ -224,7 +267,7 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
         *result = -ENOSYS;
         return Ok();
     }
-    ClientEntry& entry = it->second;
+    ClientEntry& entry = *it->second;
     if (entry.state == 1) {
         *result = -EEXIST;
         return Ok();
@@ -235,9 +278,10 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
     entry.period = effective_period;
     entry.notify_cv = std::make_unique<std::condition_variable>();
     entry.notify_mutex = std::make_unique<std::mutex>();
+    const uint64_t generation = ++entry.notify_generation;
     if (entry.callback) {
-        entry.notify_thread =
-            std::make_unique<std::thread>(&VYRService::NotifyLoop, this, handle, &entry);
+        entry.notify_thread = std::make_unique<std::thread>(&VYRService::NotifyLoop, this, handle,
+                                                            it->second, generation);
     }
     QueueForMode(entry.mode).PushAndSignal(WorkItem{true, entry.mode, handle, effective_period});
     *result = 0;
@@ -256,7 +300,7 @@ void VYRService::DisableInternal(int32_t handle, bool) {
         ALOGW("%s invalid handle %d", __func__, handle);
         return;
     }
-    ClientEntry& entry = it->second;
+    ClientEntry& entry = *it->second;
     if (entry.state == 0) {
         ALOGD("%s already in disable state %d", __func__, handle);
         return;
@@ -274,7 +318,7 @@ ndk::ScopedAStatus VYRService::EnableLowPower(int32_t handle, bool enable, int32
         *result = -ENOSYS;
         return Ok();
     }
-    if (it->second.mode == kRangeMode) {
+    if (it->second->mode == kRangeMode) {
         *result = -EINVAL;
         return Ok();
     }
@@ -296,7 +340,7 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
         *result = -EINVAL;
         return Ok();
     }
-    ClientEntry& entry = it->second;
+    ClientEntry& entry = *it->second;
     if (entry.state == 1) {
         // The notification thread reads the callback without a lock.
         ALOGE("%s failed. callback can only be set at DISABLE state", __func__);
@@ -309,17 +353,70 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
         *result = -EINVAL;
         return Ok();
     }
+    // The earlier link goes: one link per client keeps memory bounded by the live callbacks,
+    // and the client is still disabled and closed once when its process dies.
+    UnlinkDeath(&entry);
     entry.callback = callback;
     entry.callback_binder = entry.callback->asBinder();
 
-    DeathLink& link = death_links_.emplace_back(DeathLink{
-        std::make_unique<DeathCookie>(entry.callback_binder.get(), this),
-        {AIBinder_DeathRecipient_new(&VYRService::OnBinderDied), &AIBinder_DeathRecipient_delete}});
-    entry.death_cookie = link.cookie.get();
-    entry.death_recipient = link.recipient.get();
-    AIBinder_linkToDeath(entry.callback_binder.get(), entry.death_recipient, link.cookie.get());
+    auto owned = std::make_unique<DeathLink>(entry.callback_binder.get(), this);
+    DeathLink* link = owned.get();
+    {
+        std::lock_guard<std::mutex> lock(links_mutex_);
+        death_links_.emplace(&link->cookie, std::move(owned));
+    }
+    AIBinder_DeathRecipient_setOnUnlinked(link->recipient.get(), &VYRService::OnDeathLinkUnlinked);
+    entry.death_cookie = &link->cookie;
+    entry.death_recipient = link->recipient.get();
+    if (AIBinder_linkToDeath(entry.callback_binder.get(), entry.death_recipient,
+                             const_cast<DeathCookie*>(entry.death_cookie)) != STATUS_OK) {
+        // No notice can come for a link that was never made (a binder of this process, or one
+        // already dead: its client then goes with its process).
+        std::lock_guard<std::mutex> lock(links_mutex_);
+        link->unlinked = true;
+        entry.death_cookie = nullptr;
+        entry.death_recipient = nullptr;
+    }
+    SweepDeathLinks();
     *result = 0;
     return Ok();
+}
+
+void VYRService::UnlinkDeath(ClientEntry* entry) {
+    if (entry->death_recipient == nullptr) {
+        return;
+    }
+    // A notice already on its way is delivered anyway; the runtime reports the unlink after it.
+    AIBinder_unlinkToDeath(entry->callback_binder.get(), entry->death_recipient,
+                           const_cast<DeathCookie*>(entry->death_cookie));
+    entry->death_recipient = nullptr;
+    entry->death_cookie = nullptr;
+}
+
+void VYRService::OnDeathLinkUnlinked(void* cookie) {
+    const auto* death_cookie = static_cast<const DeathCookie*>(cookie);
+    VYRService* service = death_cookie->second;
+    std::lock_guard<std::mutex> lock(service->links_mutex_);
+    auto it = service->death_links_.find(death_cookie);
+    if (it != service->death_links_.end()) {
+        it->second->unlinked = true;
+    }
+}
+
+void VYRService::SweepDeathLinks() {
+    std::vector<std::unique_ptr<DeathLink>> released;
+    {
+        std::lock_guard<std::mutex> lock(links_mutex_);
+        for (auto it = death_links_.begin(); it != death_links_.end();) {
+            if (it->second->unlinked) {
+                released.push_back(std::move(it->second));
+                it = death_links_.erase(it);
+            } else {
+                ++it;
+            }
+        }
+    }
+    // Deleted outside the lock: deleting a recipient may report an unlink.
 }
 
 void VYRService::OnBinderDied(void* cookie) {
@@ -331,17 +428,36 @@ void VYRService::OnBinderDied(void* cookie) {
 void VYRService::HandleBinderDied(AIBinder* binder) {
     LOCK_API();
     auto it = std::find_if(clients_.begin(), clients_.end(), [binder](const auto& client) {
-        return client.second.callback_binder.get() == binder;
+        return client.second->callback_binder.get() == binder;
     });
     if (it == clients_.end()) {
         return;
     }
     const int32_t handle = it->first;
-    ClientEntry& entry = it->second;
+    ClientEntry& entry = *it->second;
     ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry.mode);
     AIBinder_unlinkToDeath(entry.callback_binder.get(), entry.death_recipient, nullptr);
     DisableInternal(handle, true);
     CloseInternal(handle);
+}
+
+void VYRService::HandleClientProcessExit(pid_t pid) {
+    LOCK_API();
+    std::vector<int32_t> handles;
+    for (const auto& [handle, entry] : clients_) {
+        if (entry->opener_pid == pid) {
+            handles.push_back(handle);
+        }
+    }
+    // The same record and clean-up as a death notice; closing unlinks the callback, so a notice
+    // of the same death cannot handle the client twice.
+    for (int32_t handle : handles) {
+        ALOGI("Receive binder death callback");
+        ALOGI("client %d mode %d died; disable sensor and remove client handle", handle,
+              clients_[handle]->mode);
+        DisableInternal(handle, true);
+        CloseInternal(handle);
+    }
 }
 
 // Sensor parameters and torch state.
@@ -356,7 +472,7 @@ ndk::ScopedAStatus VYRService::ConfigureParameters(int32_t handle,
         *result = -ENOSYS;
         return Ok();
     }
-    const int32_t mode = it->second.mode;
+    const int32_t mode = it->second->mode;
     if (mode != kRangeMode) {
         ALOGE("%s, mode %d is not supported", __func__, mode);
         *result = -EINVAL;
@@ -667,31 +783,38 @@ ndk::ScopedAStatus VYRService::PollOnce(int32_t handle, Event* event, int32_t* r
         *result = -EINVAL;
         return Ok();
     }
-    *result = PollInternal(handle, it->second.mode, event) ? 0 : -ENODATA;
+    *result = PollInternal(handle, it->second->mode, event) ? 0 : -ENODATA;
     return Ok();
 }
 
-void VYRService::NotifyLoop(int32_t handle, ClientEntry* entry) {
+void VYRService::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
+                            uint64_t generation) {
     if (entry == nullptr) {
         return;
     }
+    // False once the client was disabled, also when a nested Enable has started a successor.
+    const auto enabled = [&entry, generation] {
+        return entry->state == 1 && entry->notify_generation == generation;
+    };
     Event event{};
-    while (entry->state == 1 && entry->callback) {
+    while (enabled() && entry->callback) {
         const bool ok = PollInternal(handle, entry->mode, &event);
-        if (entry->state == 0) {
+        if (!enabled()) {
             break;
         }
         if (ok) {
+            // Its own reference: OnEvent may call SetCallback or Close, which drop the entry's.
+            const std::shared_ptr<IEventCallback> callback = entry->callback;
             // A failed delivery is the death handler's business, not this loop's.
-            entry->callback->OnEvent(event);
-            if (entry->state == 0) {
+            callback->OnEvent(event);
+            if (!enabled()) {
                 break;
             }
         }
         const auto deadline = std::chrono::steady_clock::now() +
                               std::chrono::nanoseconds(int64_t{entry->period} * 1000000);
         std::unique_lock<std::mutex> lock(*entry->notify_mutex);
-        while (entry->state != 0) {
+        while (enabled()) {
             const auto left = deadline - std::chrono::steady_clock::now();
             if (left >= std::chrono::nanoseconds(1)) {
                 entry->notify_cv->wait_for(lock, left);

@@ -1,7 +1,9 @@
 #pragma once
 
 #include <aidl/android/vyr/BnVYRService.h>
+#include <android-base/thread_annotations.h>
 #include <android/binder_ibinder.h>
+#include <sys/types.h>
 
 #include <array>
 #include <atomic>
@@ -16,6 +18,7 @@
 
 #include "ambient_light_sensor.h"
 #include "client_entry.h"
+#include "client_process_watcher.h"
 #include "service_config.h"
 #include "service_mode_params.h"
 #include "ubk/range_sensor.h"
@@ -62,6 +65,9 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // Queues an item for the worker of its mode, as the binder methods and the display monitor
     // do. Lets tests reach worker states that no client sequence produces.
     void PushWorkItem(const WorkItem& item);
+    // Death links not yet given back: one per client with a callback, plus any whose notice is
+    // on its way.
+    size_t DeathLinkCount();
 
   private:
     int32_t NewHandle();
@@ -72,6 +78,13 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     void DisableInternal(int32_t handle, bool);
     void HandleBinderDied(AIBinder* binder);
     static void OnBinderDied(void* cookie);
+    static void OnDeathLinkUnlinked(void* cookie);
+    // Removes the entry's death link, so that its cookie can be given back.
+    void UnlinkDeath(ClientEntry* entry);
+    // Frees the links that the runtime has let go of; called with the API lock held.
+    void SweepDeathLinks() EXCLUDES(links_mutex_);
+    // Disables and closes every client that the ended process opened, as a death notice does.
+    void HandleClientProcessExit(pid_t pid);
 
     void WorkLoop(unsigned int sensor_type);
     void EnableWork(const WorkItem& item, ServiceModeParams* params, unsigned int sensor_type);
@@ -81,14 +94,20 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     void MonitorDisplayStatus(const std::string& path);
 
     bool PollInternal(int32_t handle, int32_t mode, aidl::android::vyr::Event* event);
-    void NotifyLoop(int32_t handle, ClientEntry* entry);
+    // Holds the entry: a nested Close from OnEvent leaves it valid until the loop has ended.
+    void NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry, uint64_t generation);
 
-    // A death link's cookie and recipient, kept until the service is destroyed so that no
-    // notice can reach freed memory. The recipient is declared last: deleting it unlinks before
-    // the cookie goes.
+    // A death link's cookie and recipient. The runtime reports when no notice can come any more
+    // (the link was removed, or its notice delivered); the link is freed after that, never
+    // before, and never inside the runtime's report.
     struct DeathLink {
-        std::unique_ptr<DeathCookie> cookie;
+        DeathLink(AIBinder* binder, VYRService* service)
+            : cookie(binder, service),
+              recipient(AIBinder_DeathRecipient_new(&VYRService::OnBinderDied),
+                        &AIBinder_DeathRecipient_delete) {}
+        DeathCookie cookie;
         std::unique_ptr<AIBinder_DeathRecipient, void (*)(AIBinder_DeathRecipient*)> recipient;
+        bool unlinked = false;
     };
 
     AmbientLightSensor* als_sensor_ = nullptr;
@@ -101,7 +120,7 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     std::array<ServiceModeParams, 3> mode_params_;
     std::timed_mutex api_lock_;
     std::array<std::mutex, 2> sensor_locks_;
-    std::unordered_map<int32_t, ClientEntry> clients_;
+    std::unordered_map<int32_t, std::shared_ptr<ClientEntry>> clients_;
     // -1 is never a handle, so the draw for the display handle itself excludes nothing else.
     int32_t display_handle_ = -1;
     // Read and written by nothing; kept so that the object keeps the deployed layout.
@@ -111,7 +130,11 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     std::atomic<bool> running_{true};
     std::unordered_map<unsigned int, std::thread> worker_threads_;
     std::array<WorkQueue, 2> work_queues_;
-    std::deque<DeathLink> death_links_;
+    // Not the API lock: the runtime reports an unlinked link also from inside a method's unlink.
+    std::mutex links_mutex_;
+    std::unordered_map<const DeathCookie*, std::unique_ptr<DeathLink>> death_links_
+        GUARDED_BY(links_mutex_);
+    std::unique_ptr<ClientProcessWatcher> process_watcher_;
 };
 
 // Builds the production service and registers it as "vyrservice".

@@ -10,10 +10,20 @@
 #include <vector>
 
 namespace apex_test {
+namespace {
+
+// A device has no /tmp; its shell and test runners write under /data/local/tmp.
+#ifdef __ANDROID__
+constexpr char kDefaultTempDir[] = "/data/local/tmp";
+#else
+constexpr char kDefaultTempDir[] = "/tmp";
+#endif
+
+}  // namespace
 
 TempInfoList::TempInfoList() {
     const char* tmp = getenv("TMPDIR");
-    std::string pattern = std::string(tmp != nullptr && *tmp != '\0' ? tmp : "/tmp") +
+    std::string pattern = std::string(tmp != nullptr && *tmp != '\0' ? tmp : kDefaultTempDir) +
                           "/apex_update_listener_test.XXXXXX";
     std::vector<char> buffer(pattern.begin(), pattern.end());
     buffer.push_back('\0');

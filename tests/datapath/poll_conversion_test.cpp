@@ -155,7 +155,7 @@ TEST_F(PollTest, AlsEventSwapsTheLastTwoChannels) {
 
     Event event = Sentinel();
     ASSERT_EQ(Poll(handle, &event), 0);
-    EXPECT_EQ(static_cast<uint8_t>(event.status), 0xAB);
+    EXPECT_EQ(event.status, 0xAB) << "the status byte is zero-extended";
     EXPECT_EQ(event.timestamp, 0x123456789ABCDEF0);
     EXPECT_EQ(event.value0, 4567.5f) << "value0 is the colour temperature";
     EXPECT_EQ(event.value1, 321.25f) << "value1 is the lux value";

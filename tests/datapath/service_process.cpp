@@ -120,4 +120,20 @@ bool ServiceProcess::WaitForLog(const std::string& text, milliseconds timeout) c
     return true;
 }
 
+long ServiceProcess::RssKib() const {
+    std::ifstream status("/proc/" + std::to_string(pid()) + "/status");
+    std::string line;
+    while (std::getline(status, line)) {
+        if (line.rfind("VmRSS:", 0) == 0) return std::strtol(line.c_str() + 6, nullptr, 10);
+    }
+    return -1;
+}
+
+size_t ServiceProcess::LogCount(const std::string& text) const {
+    const std::string log = Log();
+    size_t count = 0;
+    for (size_t at = log.find(text); at != std::string::npos; at = log.find(text, at + 1)) ++count;
+    return count;
+}
+
 }  // namespace vyr_datapath

@@ -28,6 +28,9 @@ class ServiceProcess {
     // SIGTERM, then SIGKILL if it has not ended within five seconds.
     void Stop();
     bool Running();
+    pid_t pid() const { return process_ ? process_->pid() : -1; }
+    // Resident memory of the service, in KiB; -1 when it cannot be read.
+    long RssKib() const;
 
     // The environment a client process needs to reach this service.
     std::map<std::string, std::string> ClientEnvironment() const;
@@ -40,6 +43,8 @@ class ServiceProcess {
     // The service's log (its stderr) so far.
     std::string Log() const;
     bool WaitForLog(const std::string& text, std::chrono::milliseconds timeout) const;
+    // How many times `text` occurs in the log.
+    size_t LogCount(const std::string& text) const;
 
   private:
     std::string dir_;

@@ -57,6 +57,7 @@ void DisplayTest::SetUp() {
     sensor_doubles::Reset();
     Panel("Off");
     baseline_threads_ = ThreadCount();
+    baseline_names_ = vyr_test::ThreadNames();
 }
 
 void DisplayTest::TearDown() {
@@ -78,7 +79,8 @@ void DisplayTest::TearDown() {
     fuse_.reset();
     sensor_doubles::Reset();
     EXPECT_TRUE(WaitForThreadCount(baseline_threads_, 5s))
-        << "threads left: " << ThreadCount() << ", expected " << baseline_threads_;
+        << "threads left: " << ThreadCount() << " (" << vyr_test::ThreadNames() << "), expected "
+        << baseline_threads_ << " (" << baseline_names_ << ")";
 }
 
 void DisplayTest::MakeServiceOnFuse() {

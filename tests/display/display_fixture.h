@@ -90,6 +90,7 @@ class DisplayTest : public ::testing::Test {
     vyr_test::LogCapture log_;
     std::shared_ptr<VYRService> service_;
     size_t baseline_threads_ = 0;
+    std::string baseline_names_;
     std::string panel_ = "Off";
     std::unique_ptr<FuseAttribute> fuse_;
 };

@@ -14,7 +14,7 @@ using aidl::android::vyr::Event;
 
 Event MakeEvent(size_t data_size) {
     Event event;
-    event.status = -1;  // 0xff: the top bit must survive
+    event.status = 0xff;
     event.timestamp = 0x0123456789abcdefLL;
     event.value0 = 1.5f;
     event.value1 = -3.25e7f;
@@ -76,7 +76,7 @@ TEST(EventParcelTest, EmptyDataSurvives) {
 
 TEST(EventParcelTest, ExtremeValuesSurvive) {
     Event event = MakeEvent(0);
-    event.status = std::numeric_limits<int8_t>::min();
+    event.status = std::numeric_limits<int32_t>::min();
     event.timestamp = std::numeric_limits<int64_t>::min();
     event.value0 = std::numeric_limits<float>::infinity();
     event.value1 = -0.0f;
@@ -84,7 +84,7 @@ TEST(EventParcelTest, ExtremeValuesSurvive) {
                   std::numeric_limits<float>::max(), -std::numeric_limits<float>::infinity(),
                   4294967295.0f};
     ExpectSame(event, RoundTrip(event));
-    event.status = std::numeric_limits<int8_t>::max();
+    event.status = std::numeric_limits<int32_t>::max();
     event.timestamp = std::numeric_limits<int64_t>::max();
     ExpectSame(event, RoundTrip(event));
 }

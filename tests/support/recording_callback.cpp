@@ -5,13 +5,23 @@
 namespace vyr_test {
 
 ndk::ScopedAStatus RecordingCallback::OnEvent(const aidl::android::vyr::Event& event) {
+    std::function<void(size_t)> reaction;
+    size_t count;
     {
         std::lock_guard<std::mutex> lock(mutex_);
         events_.push_back(event);
+        count = events_.size();
+        reaction = reaction_;
     }
     changed_.notify_all();
+    if (reaction) reaction(count);
     if (failing_.load()) return ndk::ScopedAStatus::fromStatus(STATUS_UNKNOWN_ERROR);
     return ndk::ScopedAStatus::ok();
+}
+
+void RecordingCallback::SetReaction(std::function<void(size_t count)> reaction) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    reaction_ = std::move(reaction);
 }
 
 std::vector<aidl::android::vyr::Event> RecordingCallback::Events() {

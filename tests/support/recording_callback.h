@@ -7,6 +7,7 @@
 #include <atomic>
 #include <chrono>
 #include <condition_variable>
+#include <functional>
 #include <mutex>
 #include <vector>
 
@@ -22,12 +23,16 @@ class RecordingCallback : public aidl::android::vyr::BnEventCallback {
     bool WaitForEvents(size_t count, std::chrono::milliseconds timeout);
     // While set, OnEvent records the event and then returns an error status.
     void SetFailing(bool failing) { failing_.store(failing); }
+    // Runs inside OnEvent, on the caller's thread, after the event is recorded, with the number
+    // of events so far: what a client does from its callback.
+    void SetReaction(std::function<void(size_t count)> reaction);
 
   private:
     std::mutex mutex_;
     std::condition_variable changed_;
     std::vector<aidl::android::vyr::Event> events_;
     std::atomic<bool> failing_{false};
+    std::function<void(size_t)> reaction_;
 };
 
 }  // namespace vyr_test

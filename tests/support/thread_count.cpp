@@ -2,19 +2,57 @@
 
 #include <dirent.h>
 
+#include <fstream>
+#include <sstream>
 #include <thread>
 
 namespace vyr_test {
+namespace {
+
+// The kernel's PF_EXITING task flag.
+constexpr unsigned long kExiting = 0x4;
+
+// A joined thread wakes its joiner before the kernel has removed its task; such a task is past
+// the point of return and is not counted.
+bool Exiting(const std::string& tid) {
+    std::ifstream stat("/proc/self/task/" + tid + "/stat");
+    std::string line;
+    if (!std::getline(stat, line)) return true;
+    std::istringstream fields(line.substr(line.rfind(')') + 1));
+    std::string skipped;
+    for (int i = 0; i < 6; ++i) fields >> skipped;  // state, ppid, pgrp, session, tty, tpgid
+    unsigned long flags = 0;
+    fields >> flags;
+    return (flags & kExiting) != 0;
+}
+
+template <typename Visit>
+void ForEachLiveThread(Visit visit) {
+    DIR* dir = opendir("/proc/self/task");
+    if (dir == nullptr) return;
+    while (dirent* entry = readdir(dir)) {
+        if (entry->d_name[0] != '.' && !Exiting(entry->d_name)) visit(std::string(entry->d_name));
+    }
+    closedir(dir);
+}
+
+}  // namespace
 
 size_t ThreadCount() {
     size_t count = 0;
-    DIR* dir = opendir("/proc/self/task");
-    if (dir == nullptr) return 0;
-    while (dirent* entry = readdir(dir)) {
-        if (entry->d_name[0] != '.') ++count;
-    }
-    closedir(dir);
+    ForEachLiveThread([&count](const std::string&) { ++count; });
     return count;
+}
+
+std::string ThreadNames() {
+    std::string names;
+    ForEachLiveThread([&names](const std::string& tid) {
+        std::ifstream comm("/proc/self/task/" + tid + "/comm");
+        std::string name;
+        std::getline(comm, name);
+        names += (names.empty() ? "" : ", ") + name;
+    });
+    return names;
 }
 
 bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {

@@ -74,8 +74,7 @@ std::string JsonList(const std::vector<float>& values) {
 }
 
 std::string StatusText(const Event& event) {
-    // status carries an unsigned byte of the sensor record.
-    return std::to_string(static_cast<uint8_t>(event.status));
+    return std::to_string(event.status);
 }
 
 }  // namespace

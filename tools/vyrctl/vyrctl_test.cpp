@@ -59,7 +59,7 @@ class FakeService : public aidl::android::vyr::BnVYRService {
             *result = -61;
             return ndk::ScopedAStatus::ok();
         }
-        event->status = static_cast<int8_t>(0xAB);
+        event->status = 0xAB;
         event->timestamp = 123;
         event->value0 = 0.5f;
         event->value1 = -2;

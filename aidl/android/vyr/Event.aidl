@@ -2,7 +2,8 @@ package android.vyr;
 
 // One reading of a sensor mode, as the service hands it to a client.
 parcelable Event {
-    byte status;
+    // The sensor's unsigned status byte, zero-extended (an AIDL byte is signed).
+    int status;
     long timestamp;
     float value0;
     float value1;

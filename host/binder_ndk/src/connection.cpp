@@ -1,9 +1,13 @@
 #include "connection.h"
 
 #include <android/binder_parcel_utils.h>
+#include <poll.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
 #include <utility>
 
 #include "call_context.h"
@@ -20,6 +24,10 @@ namespace {
 constexpr uint64_t kContextObject = 0;
 constexpr transaction_code_t kLookupCode = 1;
 constexpr size_t kMaxKeyBytes = 128;
+// Calls of one peer received and not yet answered (queued oneway calls included), and their
+// bytes; a peer with more is dropped.
+constexpr uint32_t kMaxCallsInFlight = 1024;
+constexpr size_t kMaxCallBytesInFlight = 16u << 20;
 
 Looper& TheLooper() {
     return ProcessState::Get().looper();
@@ -75,6 +83,11 @@ void Connection::OnReadable(bool can_serve) {
 bool Connection::ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call) {
     FrameBuffer::Result result = buffer_.Fill(fd_, wait);
     if (result == FrameBuffer::Result::kNoData) return true;
+    if (result == FrameBuffer::Result::kOverLimit) {
+        fprintf(stderr, "binder: dropping peer %d: receive buffers over %zu bytes in all\n",
+                peer_pid_, kMaxBufferedBytesPerProcess);
+        return false;
+    }
     while (result == FrameBuffer::Result::kFrame) {
         Frame frame;
         buffer_.Take(&frame);
@@ -250,8 +263,85 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
     header.transaction_id = id;
     header.target = target;
     header.parent = parent;
+    iovec iov[3] = {
+        {&header, sizeof(header)},
+        {parcel == nullptr ? nullptr : const_cast<uint8_t*>(parcel->data.data()), header.data_size},
+        {table.data(), table.size()},
+    };
+    const size_t total = sizeof(header) + header.data_size + table.size();
     std::lock_guard<std::mutex> lock(send_mutex_);
-    return SendFrame(fd_, header, parcel == nullptr ? nullptr : parcel->data.data(), table);
+    if (send_refused_) return false;
+    size_t sent = 0;
+    // Never wait for a peer: one that does not read must not hold this thread, which may be the
+    // one that other peers' calls need.
+    if (pending_out_.empty() && !SendSome(fd_, iov, 3, &sent)) return false;
+    if (sent == total) return true;
+    if (pending_out_.size() - pending_sent_ + total - sent > kMaxPendingSendBytes) {
+        fprintf(stderr, "binder: dropping peer %d: it does not read (over %zu bytes unsent)\n",
+                peer_pid_, kMaxPendingSendBytes);
+        send_refused_ = true;
+        return false;
+    }
+    // What the peer has taken goes first, so the queue holds only unsent bytes.
+    pending_out_.erase(pending_out_.begin(), pending_out_.begin() + pending_sent_);
+    pending_sent_ = 0;
+    for (const iovec& part : iov) {
+        const uint8_t* bytes = static_cast<const uint8_t*>(part.iov_base);
+        const size_t skip = std::min(sent, part.iov_len);
+        sent -= skip;
+        if (part.iov_len > skip)
+            pending_out_.insert(pending_out_.end(), bytes + skip, bytes + part.iov_len);
+    }
+    if (!flushing_) {
+        flushing_ = true;
+        std::shared_ptr<Connection> self = shared_from_this();
+        TheLooper().RunTask([self] { self->FlushPending(); });
+    }
+    return true;
+}
+
+void Connection::FlushPending() {
+    while (true) {
+        bool alive;
+        {
+            std::lock_guard<std::mutex> lock(send_mutex_);
+            iovec rest{pending_out_.data() + pending_sent_, pending_out_.size() - pending_sent_};
+            size_t sent = 0;
+            alive = !dead() && SendSome(fd_, &rest, 1, &sent);
+            pending_sent_ += sent;
+            if (!alive || pending_sent_ == pending_out_.size()) {
+                std::vector<uint8_t>().swap(pending_out_);
+                pending_sent_ = 0;
+                flushing_ = false;
+                if (alive) return;
+            }
+        }
+        if (!alive) {
+            Die();
+            return;
+        }
+        // Until the peer reads, dies, or the runtime shuts down.
+        pollfd fds[2] = {{fd_, POLLOUT, 0}, {TheLooper().stop_fd(), POLLIN, 0}};
+        if (poll(fds, 2, -1) < 0 && errno != EINTR) return;
+        if (fds[1].revents != 0) return;
+    }
+}
+
+bool Connection::AdmitCall(const Incoming& call) {
+    const uint32_t calls = calls_in_flight_.fetch_add(1, std::memory_order_relaxed) + 1;
+    const size_t bytes =
+        call_bytes_in_flight_.fetch_add(call.data->data.size(), std::memory_order_relaxed) +
+        call.data->data.size();
+    if (calls <= kMaxCallsInFlight && bytes <= kMaxCallBytesInFlight) return true;
+    CallServed(call);
+    fprintf(stderr, "binder: dropping peer %d: over %u calls or %zu bytes of calls waiting\n",
+            peer_pid_, kMaxCallsInFlight, kMaxCallBytesInFlight);
+    return false;
+}
+
+void Connection::CallServed(const Incoming& call) {
+    calls_in_flight_.fetch_sub(1, std::memory_order_relaxed);
+    call_bytes_in_flight_.fetch_sub(call.data->data.size(), std::memory_order_relaxed);
 }
 
 binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, const AParcel& in,
@@ -367,6 +457,7 @@ bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out)
         if (!oneway) ServeContextCall(*call);
         return true;
     }
+    if (!AdmitCall(*call)) return false;
     {
         std::lock_guard<std::mutex> lock(mutex_);
         auto it = exports_.find(header.target);
@@ -381,6 +472,7 @@ bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out)
         }
     }
     if (call->target.get() == nullptr) {
+        CallServed(*call);
         if (!oneway) SendReply(call->id, STATUS_DEAD_OBJECT, AParcel());
         return true;
     }
@@ -430,6 +522,7 @@ void Connection::Serve(Incoming& call) {
     call.data->pos = 0;
     binder_status_t status =
         call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
+    CallServed(call);
     if ((call.flags & FLAG_ONEWAY) == 0) SendReply(call.id, status, reply);
 }
 

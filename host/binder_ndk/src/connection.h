@@ -100,6 +100,11 @@ class Connection : public std::enable_shared_from_this<Connection> {
     bool Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
               uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects);
     void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
+    // Sends what the socket would not take at once, on a runtime thread, as the peer reads.
+    void FlushPending();
+    // Counts a received call until it has been served; false when the peer has too many.
+    bool AdmitCall(const Incoming& call);
+    void CallServed(const Incoming& call);
 
     const int fd_;
     uint64_t serial_ = 0;
@@ -108,6 +113,16 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::atomic<bool> dead_{false};
 
     std::mutex send_mutex_;
+    // Frames, or their tails, that the peer has not taken yet; sent in order before anything
+    // new. Guarded by send_mutex_.
+    std::vector<uint8_t> pending_out_;
+    size_t pending_sent_ = 0;
+    bool flushing_ = false;
+    // Set once the peer let too much pile up; the connection is on its way out.
+    bool send_refused_ = false;
+    // Calls received and not yet answered, and their bytes: what a flooding peer holds here.
+    std::atomic<uint32_t> calls_in_flight_{0};
+    std::atomic<size_t> call_bytes_in_flight_{0};
 
     std::mutex mutex_;
     uint64_t next_transaction_id_ = 1;

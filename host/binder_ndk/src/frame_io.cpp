@@ -1,24 +1,49 @@
 #include "frame_io.h"
 
 #include <errno.h>
-#include <poll.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
 
+#include <algorithm>
+#include <atomic>
 #include <cstring>
 
 namespace vyr_binder {
 namespace {
 
-// How long a peer may keep us from sending a frame before the connection counts as broken.
-constexpr int kSendStallMillis = 10000;
 constexpr size_t kReadChunk = 16 * 1024;
+
+std::atomic<size_t> g_buffered_bytes{0};
 
 size_t FrameSize(const FrameHeader& header) {
     return sizeof(FrameHeader) + header.data_size + header.table_size;
 }
 
 }  // namespace
+
+size_t BufferedBytes() {
+    return g_buffered_bytes.load(std::memory_order_relaxed);
+}
+
+FrameBuffer::~FrameBuffer() {
+    g_buffered_bytes.fetch_sub(buffer_.size(), std::memory_order_relaxed);
+}
+
+bool FrameBuffer::Resize(size_t size) {
+    if (size > buffer_.size()) {
+        const size_t growth = size - buffer_.size();
+        if (g_buffered_bytes.fetch_add(growth, std::memory_order_relaxed) + growth >
+            kMaxBufferedBytesPerProcess) {
+            g_buffered_bytes.fetch_sub(growth, std::memory_order_relaxed);
+            return false;
+        }
+        buffer_.resize(size);
+        return true;
+    }
+    g_buffered_bytes.fetch_sub(buffer_.size() - size, std::memory_order_relaxed);
+    std::vector<uint8_t>(buffer_.begin(), buffer_.begin() + size).swap(buffer_);
+    return true;
+}
 
 FrameBuffer::Result FrameBuffer::Check() const {
     if (Available() < sizeof(FrameHeader)) return Result::kNoData;
@@ -32,19 +57,22 @@ FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
     for (;;) {
         Result result = Check();
         if (result != Result::kNoData) return result;
-        // Room for the whole frame once its header is known (checked, so at most ~2 MiB).
+        // Room for the rest of the frame once its header is known, but never more than what has
+        // arrived so far again: a header alone cannot make the buffer large.
         size_t needed = kReadChunk;
         if (Available() >= sizeof(FrameHeader)) {
             FrameHeader header;
             std::memcpy(&header, buffer_.data() + begin_, sizeof(header));
-            needed = FrameSize(header) > needed ? FrameSize(header) : needed;
+            needed = std::min(FrameSize(header), std::max(kReadChunk, 2 * Available()));
         }
         if (begin_ > 0 && buffer_.size() - begin_ < needed) {
             std::memmove(buffer_.data(), buffer_.data() + begin_, Available());
             end_ -= begin_;
             begin_ = 0;
         }
-        if (buffer_.size() - begin_ < needed) buffer_.resize(begin_ + needed);
+        if (buffer_.size() - begin_ < needed && !Resize(begin_ + needed)) {
+            return Result::kOverLimit;
+        }
         ssize_t n = recv(fd, buffer_.data() + end_, buffer_.size() - end_, wait ? 0 : MSG_DONTWAIT);
         if (n > 0) {
             end_ += static_cast<size_t>(n);
@@ -67,38 +95,33 @@ void FrameBuffer::Take(Frame* frame) {
     if (begin_ == end_) {
         begin_ = end_ = 0;
         // Give back the room a large frame took.
-        if (buffer_.size() > 4 * kReadChunk) std::vector<uint8_t>(kReadChunk).swap(buffer_);
+        if (buffer_.size() > 4 * kReadChunk) Resize(kReadChunk);
     }
 }
 
-bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
-               const std::vector<uint8_t>& table) {
-    iovec iov[3] = {
-        {const_cast<FrameHeader*>(&header), sizeof(header)},
-        {const_cast<uint8_t*>(data), header.data_size},
-        {const_cast<uint8_t*>(table.data()), table.size()},
-    };
-    size_t first = 0;
-    while (first < 3) {
+bool SendSome(int fd, const iovec* iov, int count, size_t* sent) {
+    *sent = 0;
+    iovec rest[4];
+    int first = 0;
+    for (int i = 0; i < count; ++i) rest[i] = iov[i];
+    while (first < count) {
         msghdr msg{};
-        msg.msg_iov = iov + first;
-        msg.msg_iovlen = 3 - first;
+        msg.msg_iov = rest + first;
+        msg.msg_iovlen = static_cast<size_t>(count - first);
         ssize_t n = sendmsg(fd, &msg, MSG_NOSIGNAL | MSG_DONTWAIT);
         if (n < 0) {
             if (errno == EINTR) continue;
-            if (errno != EAGAIN && errno != EWOULDBLOCK) return false;
-            pollfd p{fd, POLLOUT, 0};
-            if (poll(&p, 1, kSendStallMillis) == 0) return false;
-            continue;
+            return errno == EAGAIN || errno == EWOULDBLOCK;
         }
-        size_t sent = static_cast<size_t>(n);
-        while (first < 3 && sent >= iov[first].iov_len) {
-            sent -= iov[first].iov_len;
+        size_t taken = static_cast<size_t>(n);
+        *sent += taken;
+        while (first < count && taken >= rest[first].iov_len) {
+            taken -= rest[first].iov_len;
             ++first;
         }
-        if (first < 3) {
-            iov[first].iov_base = static_cast<uint8_t*>(iov[first].iov_base) + sent;
-            iov[first].iov_len -= sent;
+        if (first < count) {
+            rest[first].iov_base = static_cast<uint8_t*>(rest[first].iov_base) + taken;
+            rest[first].iov_len -= taken;
         }
     }
     return true;

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <sys/uio.h>
+
 #include <cstddef>
 #include <cstdint>
 #include <vector>
@@ -15,11 +17,24 @@ struct Frame {
     std::vector<uint8_t> table;
 };
 
+// Receive buffers of all connections together may hold at most this much; a connection whose
+// buffer would grow beyond it is dropped.
+constexpr size_t kMaxBufferedBytesPerProcess = 64u << 20;
+// Frames that a peer does not read at once wait in its connection, up to this much; a peer that
+// lets more pile up is dropped.
+constexpr size_t kMaxPendingSendBytes = 4u << 20;
+
 // The bytes read from one socket and not yet handled. Reads take whatever has arrived, so a
-// small frame costs one read; a frame still arriving simply stays buffered.
+// small frame costs one read; a frame still arriving simply stays buffered. The buffer grows with
+// the bytes that actually arrive (at most doubling), never with what a header announces.
 class FrameBuffer {
   public:
-    enum class Result { kFrame, kNoData, kClosed, kMalformed };
+    enum class Result { kFrame, kNoData, kClosed, kMalformed, kOverLimit };
+
+    FrameBuffer() = default;
+    ~FrameBuffer();
+    FrameBuffer(const FrameBuffer&) = delete;
+    FrameBuffer& operator=(const FrameBuffer&) = delete;
 
     // Reads until a whole frame is buffered: with `wait` blocking as long as it takes, without
     // it returning kNoData as soon as the socket has nothing more.
@@ -31,15 +46,19 @@ class FrameBuffer {
 
   private:
     size_t Available() const { return end_ - begin_; }
+    // Resizes the buffer within the process-wide budget; false if that would exceed it.
+    bool Resize(size_t size);
 
     std::vector<uint8_t> buffer_;
     size_t begin_ = 0;
     size_t end_ = 0;
 };
 
-// Sends one frame whole; false when the peer is gone or stopped reading. Callers serialise
-// sends per socket.
-bool SendFrame(int fd, const FrameHeader& header, const uint8_t* data,
-               const std::vector<uint8_t>& table);
+// Bytes that all receive buffers of this process hold now.
+size_t BufferedBytes();
+
+// Sends as much of the `count` (at most 4) buffers as the socket takes without waiting, and
+// tells how many bytes that was; false when the peer is gone.
+bool SendSome(int fd, const iovec* iov, int count, size_t* sent);
 
 }  // namespace vyr_binder

@@ -56,6 +56,10 @@ class Looper {
     // Stops and joins every thread; queued work is dropped. Everything works again after.
     void Shutdown();
 
+    // Readable while the runtime shuts down: a task that waits on something else waits on this
+    // too.
+    int stop_fd() const { return stop_fd_; }
+
     // True on the looper, pool and joined threads.
     static bool OnRuntimeThread();
 

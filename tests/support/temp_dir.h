@@ -13,7 +13,7 @@
 class TempDir {
   public:
     TempDir() {
-        char path[] = "/tmp/vyr_sensors_XXXXXX";
+        char path[] = "/tmp/vyr_test_XXXXXX";
         if (mkdtemp(path) == nullptr) ADD_FAILURE() << "mkdtemp failed";
         path_ = path;
     }

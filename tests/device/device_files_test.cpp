@@ -1,0 +1,236 @@
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <optional>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "child_process.h"
+#include "temp_dir.h"
+
+namespace {
+
+namespace fs = std::filesystem;
+
+std::string ReadFile(const fs::path& path) {
+    std::ifstream file(path);
+    std::stringstream text;
+    text << file.rdbuf();
+    return text.str();
+}
+
+void WriteFile(const fs::path& path, const std::string& text) {
+    fs::create_directories(path.parent_path());
+    std::ofstream(path, std::ios::trunc) << text;
+}
+
+struct CheckResult {
+    int exit_status = -1;
+    std::string output;  // stdout and stderr
+};
+
+// Each test breaks one thing in its own copy of the source tree and runs the device check on it.
+class DeviceFilesTest : public ::testing::Test {
+  protected:
+    void SetUp() override {
+        tree_ = temp_.Path("tree");
+        fs::create_directories(tree_);
+        for (const fs::directory_entry& entry : fs::directory_iterator(VYR_SOURCE_DIR)) {
+            const std::string name = entry.path().filename();
+            if (name == "build" || name == ".git") continue;
+            fs::copy(entry.path(), tree_ / name, fs::copy_options::recursive);
+        }
+    }
+
+    CheckResult Check(const fs::path& root, std::vector<std::string> extra = {}) {
+        std::vector<std::string> argv = {std::string(VYR_SOURCE_DIR) + "/scripts/check-device",
+                                         root.string()};
+        argv.insert(argv.end(), extra.begin(), extra.end());
+        const std::string stderr_path = temp_.Path("stderr");
+        CheckResult result;
+        {
+            vyr_test::ChildProcess child(argv, {}, stderr_path);
+            EXPECT_TRUE(child.started());
+            while (std::optional<std::string> line =
+                       child.ReadLine(std::chrono::milliseconds(30000))) {
+                result.output += *line + "\n";
+            }
+            const std::optional<int> status = child.Wait(std::chrono::milliseconds(30000));
+            EXPECT_TRUE(status.has_value()) << "check-device did not end";
+            if (status && WIFEXITED(*status)) result.exit_status = WEXITSTATUS(*status);
+        }
+        result.output += ReadFile(stderr_path);
+        return result;
+    }
+    CheckResult CheckCopy() { return Check(tree_); }
+
+    void Edit(const std::string& relative, const std::string& from, const std::string& to) {
+        std::string text = ReadFile(tree_ / relative);
+        const size_t at = text.find(from);
+        ASSERT_NE(at, std::string::npos) << relative << " has no " << from;
+        text.replace(at, from.size(), to);
+        WriteFile(tree_ / relative, text);
+    }
+    void Append(const std::string& relative, const std::string& text) {
+        WriteFile(tree_ / relative, ReadFile(tree_ / relative) + text);
+    }
+    // The host build's list of library sources, as if it had been configured on the copy.
+    fs::path ParityFileOfCopy() {
+        std::string text = ReadFile(VYR_DEVICE_PARITY_FILE);
+        const std::string source_dir = std::string(VYR_SOURCE_DIR) + "/";
+        for (size_t at = text.find(source_dir); at != std::string::npos;
+             at = text.find(source_dir, at)) {
+            text.replace(at, source_dir.size(), tree_.string() + "/");
+            at += tree_.string().size() + 1;
+        }
+        const fs::path parity = temp_.Path("parity.txt");
+        WriteFile(parity, text);
+        return parity;
+    }
+
+    TempDir temp_;
+    fs::path tree_;
+};
+
+#define EXPECT_FAILS_WITH(result, text)                                    \
+    do {                                                                   \
+        const CheckResult& r = (result);                                   \
+        EXPECT_EQ(r.exit_status, 1) << r.output;                           \
+        EXPECT_NE(r.output.find(text), std::string::npos) << r.output;     \
+        EXPECT_NE(r.output.find("device files: FAIL"), std::string::npos); \
+    } while (0)
+
+TEST_F(DeviceFilesTest, TheCommittedTreeAndTheHostBuildPass) {
+    const CheckResult result = Check(VYR_SOURCE_DIR, {"--cmake-sources", VYR_DEVICE_PARITY_FILE});
+    EXPECT_EQ(result.exit_status, 0) << result.output;
+    EXPECT_NE(result.output.find("device files: PASS"), std::string::npos) << result.output;
+}
+
+TEST_F(DeviceFilesTest, TheCopyPassesUnchanged) {
+    const CheckResult result = Check(tree_, {"--cmake-sources", ParityFileOfCopy().string()});
+    EXPECT_EQ(result.exit_status, 0) << result.output;
+}
+
+TEST_F(DeviceFilesTest, AnAndroidBpThatBpfmtWouldReformatFails) {
+    Edit("vyrservice/Android.bp", "    srcs: [\"main.cpp\"],\n", "    srcs: [ \"main.cpp\" ],\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice/Android.bp is not formatted");
+}
+
+TEST_F(DeviceFilesTest, AnAndroidBpThatDoesNotParseFails) {
+    Append("sensors/Android.bp", "cc_library {\n    name: \n");
+    EXPECT_FAILS_WITH(CheckCopy(), "sensors/Android.bp does not parse");
+}
+
+TEST_F(DeviceFilesTest, RemovingAMethodBreaksTheFrozenInterface) {
+    Edit("aidl/android/vyr/IVYRService.aidl", "    void SetTorchLightState(int state);\n", "");
+    const CheckResult result = CheckCopy();
+    EXPECT_FAILS_WITH(result, "aidl/ is not a compatible extension of frozen version 1");
+    EXPECT_NE(result.output.find("SetTorchLightState"), std::string::npos) << result.output;
+}
+
+TEST_F(DeviceFilesTest, WideningAFieldBreaksTheFrozenInterface) {
+    Edit("aidl/android/vyr/Event.aidl", "long timestamp;", "double timestamp;");
+    EXPECT_FAILS_WITH(CheckCopy(), "aidl/ is not a compatible extension of frozen version 1");
+}
+
+TEST_F(DeviceFilesTest, AddingAMethodWithoutUpdatingCurrentFails) {
+    Edit("aidl/android/vyr/IVYRService.aidl", "    void SetTorchLightState(int state);\n",
+         "    void SetTorchLightState(int state);\n    int Reset();\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "aidl_api/android.vyr/current differs from aidl/");
+}
+
+TEST_F(DeviceFilesTest, AnEditedFrozenDumpNoLongerMatchesItsHash) {
+    Append("aidl_api/android.vyr/1/android/vyr/Event.aidl", "// edited\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "aidl_api/android.vyr/1/.hash does not match its files");
+}
+
+TEST_F(DeviceFilesTest, AnUndeclaredTypeFails) {
+    Append("sepolicy/vyrservice.te", "allow vyrservice vyr_camera_device:chr_file read;\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "type vyr_camera_device is used but not declared");
+}
+
+TEST_F(DeviceFilesTest, AContextWithAnUndeclaredTypeFails) {
+    Edit("sepolicy/file_contexts", "vyrservice_exec", "vyrservice_binary");
+    EXPECT_FAILS_WITH(CheckCopy(), "type vyrservice_binary is used but not declared");
+}
+
+TEST_F(DeviceFilesTest, AGenfsPathThatTheCodeDoesNotOpenFails) {
+    Edit("sepolicy/genfs_contexts", "panel0-backlight/state", "panel1-backlight/state");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "/sys/class/backlight/panel1-backlight/state is not a path that the code "
+                      "opens");
+}
+
+TEST_F(DeviceFilesTest, AFileContextsPathThatNothingUsesFails) {
+    Append("sepolicy/file_contexts", "/vendor/etc/vyr.conf    u:object_r:vyrservice_exec:s0\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "/vendor/etc/vyr.conf is neither the installed binary");
+}
+
+TEST_F(DeviceFilesTest, AServiceNameThatTheCodeDoesNotRegisterFails) {
+    Edit("sepolicy/vndservice_contexts", "vyrservice ", "vyr.service ");
+    EXPECT_FAILS_WITH(CheckCopy(), "service vyr.service is not registered by the code");
+}
+
+TEST_F(DeviceFilesTest, ARenamedRegistrationFails) {
+    Edit("vyrservice/vyrservice.cpp", "kServiceName[] = \"vyrservice\"",
+         "kServiceName[] = \"vyrservice2\"");
+    EXPECT_FAILS_WITH(CheckCopy(), "registered service vyrservice2 has no context");
+}
+
+TEST_F(DeviceFilesTest, AnInitPathOtherThanTheInstallPathFails) {
+    Edit("vyrservice/vyrservice.rc", "/vendor/bin/vyrservice", "/vendor/bin/hw/vyrservice");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "runs /vendor/bin/hw/vyrservice, but Android.bp installs the binary at "
+                      "/vendor/bin/vyrservice");
+}
+
+TEST_F(DeviceFilesTest, AOneshotServiceFails) {
+    Append("vyrservice/vyrservice.rc", "    oneshot\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "is oneshot: init would not restart it");
+}
+
+TEST_F(DeviceFilesTest, AServiceThatKeepsCapabilitiesFails) {
+    Edit("vyrservice/vyrservice.rc", "    capabilities\n", "    capabilities SYS_NICE\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "does not drop every capability");
+}
+
+TEST_F(DeviceFilesTest, ASourceMissingFromAndroidBpFails) {
+    WriteFile(tree_ / "vyrservice/display_monitor.cpp", "\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice/display_monitor.cpp: is in no module of Android.bp");
+}
+
+TEST_F(DeviceFilesTest, ASourceOnlyTheHostBuildCompilesFails) {
+    const fs::path parity = ParityFileOfCopy();
+    Edit(parity.string(), "vyrservice/work_queue.cpp",
+         "vyrservice/work_queue.cpp;" + (tree_ / "vyrservice/host_only.cpp").string());
+    const CheckResult result = Check(tree_, {"--cmake-sources", parity.string()});
+    EXPECT_FAILS_WITH(result,
+                      "vyrservice/host_only.cpp: is built into libvyrservice on the host "
+                      "only");
+}
+
+TEST_F(DeviceFilesTest, ASourceOnlyTheDeviceBuildCompilesFails) {
+    const fs::path parity = ParityFileOfCopy();
+    Edit(parity.string(), ";" + (tree_ / "vyrservice/work_queue.cpp").string(), "");
+    const CheckResult result = Check(tree_, {"--cmake-sources", parity.string()});
+    EXPECT_FAILS_WITH(result,
+                      "vyrservice/work_queue.cpp: is built into libvyrservice on the "
+                      "device only");
+}
+
+TEST_F(DeviceFilesTest, AnAndroidBpInAHostOnlyFolderFails) {
+    WriteFile(tree_ / "host/binder_ndk/Android.bp", "cc_library {\n    name: \"libx\",\n}\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "host/binder_ndk/Android.bp: a host-only folder");
+}
+
+TEST_F(DeviceFilesTest, AModuleThatReachesIntoTheHostRuntimeFails) {
+    Edit("vyrservice/Android.bp", "        \"work_queue.cpp\",\n",
+         "        \"work_queue.cpp\",\n        \"../host/properties/properties.cpp\",\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "libvyrservice reaches the host-only host/properties");
+}
+
+}  // namespace

@@ -1,0 +1,434 @@
+#!/usr/bin/env python3
+"""Checks the device build files against each other and against the code.
+
+  check_device_files.py ROOT [--cmake-sources FILE]
+
+- every SELinux type, attribute or property type that the policy uses is declared by the policy
+  or is one of the platform's (PLATFORM_TYPES);
+- every path in file_contexts and genfs_contexts is the installed binary or a path the code opens;
+- vndservice_contexts names the service that the code registers;
+- the init service runs the path where Android.bp installs the vendor binary that carries the .rc;
+- every .cpp of the service and the listener is in Android.bp, and (with --cmake-sources, written
+  by the host build) the host build compiles the same sources for each library;
+- no Android.bp exists in, or points into, a host-only folder.
+
+Prints one line per defect and exits 1 if there is any.
+"""
+
+import argparse
+import os
+import re
+import sys
+
+# Types and attributes of the platform policy (system/sepolicy) that this policy uses.
+PLATFORM_TYPES = {
+    "apex_info_file",
+    "apex_mnt_dir",
+    "domain",
+    "exec_type",
+    "file_type",
+    "fs_type",
+    "sysfs_type",
+    "vendor_file_type",
+    "vndservice_manager_type",
+}
+# Policy macros that declare their first argument.
+DECLARING_MACROS = {"vendor_internal_prop", "vendor_restricted_prop", "vendor_public_prop"}
+# Folders that only the host build uses.
+HOST_ONLY = ["host", "sensors/simulator", "sensors/doubles", "tools/sandbox"]
+# Folders whose every .cpp belongs to a library or binary of both builds.
+SERVICE_FOLDERS = ["vyrservice", "apex_update_listener"]
+# A vendor cc_binary is installed here.
+VENDOR_BIN = "/vendor/bin/"
+
+
+class Checker:
+    def __init__(self, root):
+        self.root = root
+        self.defects = []
+
+    def defect(self, where, text):
+        self.defects.append(f"{where}: {text}")
+
+    def read(self, relative):
+        with open(os.path.join(self.root, relative), encoding="utf-8") as f:
+            return f.read()
+
+    def exists(self, relative):
+        return os.path.exists(os.path.join(self.root, relative))
+
+
+# --- Blueprint -----------------------------------------------------------------------------------
+
+
+class BlueprintParser:
+    """Modules of one Android.bp: {"type", "props"} with strings, bools, lists and maps."""
+
+    TOKEN = re.compile(r'\s*(?://[^\n]*|/\*.*?\*/|"(?:\\.|[^"\\])*"|[A-Za-z_][\w.]*|-?\d+|\S)',
+                       re.S)
+
+    def __init__(self, text, where):
+        self.where = where
+        self.tokens = [t for t in self.TOKEN.findall(text)
+                       if t.strip() and not t.lstrip().startswith(("//", "/*"))]
+        self.tokens = [t.strip() for t in self.tokens]
+        self.pos = 0
+
+    def peek(self):
+        return self.tokens[self.pos] if self.pos < len(self.tokens) else None
+
+    def take(self, expected=None):
+        token = self.peek()
+        if token is None or (expected is not None and token != expected):
+            raise ValueError(f"{self.where}: expected {expected!r}, found {token!r}")
+        self.pos += 1
+        return token
+
+    def modules(self):
+        result = []
+        while self.peek() is not None:
+            name = self.take()
+            if self.peek() == "=" or self.peek() == "+":
+                while self.peek() != "=":
+                    self.take()
+                self.take("=")
+                self.value()
+                continue
+            result.append({"type": name, "props": self.map_body()})
+        return result
+
+    def map_body(self):
+        self.take("{")
+        props = {}
+        while self.peek() != "}":
+            key = self.take()
+            self.take(":")
+            props[key] = self.value()
+            if self.peek() == ",":
+                self.take(",")
+        self.take("}")
+        return props
+
+    def value(self):
+        token = self.peek()
+        if token == "{":
+            result = self.map_body()
+        elif token == "[":
+            self.take("[")
+            result = []
+            while self.peek() != "]":
+                result.append(self.value())
+                if self.peek() == ",":
+                    self.take(",")
+            self.take("]")
+        elif token.startswith('"'):
+            result = self.take()[1:-1]
+        elif token in ("true", "false"):
+            result = self.take() == "true"
+        else:
+            result = self.take()
+        if self.peek() == "+":
+            self.take("+")
+            other = self.value()
+            result = result + other if type(result) is type(other) else result
+        return result
+
+
+def android_bp_files(root):
+    found = []
+    for directory, subdirs, files in os.walk(root):
+        subdirs[:] = [d for d in subdirs if d not in (".git", "build")]
+        if "Android.bp" in files:
+            found.append(os.path.relpath(os.path.join(directory, "Android.bp"), root))
+    return sorted(found)
+
+
+def load_modules(checker):
+    modules = []
+    for bp in android_bp_files(checker.root):
+        try:
+            parsed = BlueprintParser(checker.read(bp), bp).modules()
+        except (ValueError, AttributeError) as error:
+            checker.defect(bp, f"cannot parse: {error}")
+            continue
+        for module in parsed:
+            module["dir"] = os.path.dirname(bp)
+            module["file"] = bp
+            modules.append(module)
+    defaults = {m["props"].get("name"): m["props"] for m in modules if m["type"] == "cc_defaults"}
+    for module in modules:
+        for name in module["props"].get("defaults", []):
+            for key, value in defaults.get(name, {}).items():
+                own = module["props"].get(key)
+                if key == "name":
+                    continue
+                if own is None:
+                    module["props"][key] = value
+                elif isinstance(own, list) and isinstance(value, list):
+                    module["props"][key] = value + own
+    return modules
+
+
+def strings_in(value):
+    if isinstance(value, str):
+        yield value
+    elif isinstance(value, list):
+        for item in value:
+            yield from strings_in(item)
+    elif isinstance(value, dict):
+        for item in value.values():
+            yield from strings_in(item)
+
+
+# --- What the code does --------------------------------------------------------------------------
+
+
+def code_files(checker):
+    files = []
+    for folder in SERVICE_FOLDERS:
+        path = os.path.join(checker.root, folder)
+        if os.path.isdir(path):
+            files += [os.path.join(folder, f) for f in sorted(os.listdir(path))
+                      if f.endswith((".cpp", ".h"))]
+    return files
+
+
+def code_paths(checker):
+    """Absolute file paths written as string literals in the service's code."""
+    paths = set()
+    for relative in code_files(checker):
+        paths.update(re.findall(r'"(/(?:sys|apex|dev|proc|data|vendor)/[^"\s]*)"',
+                                checker.read(relative)))
+    return paths
+
+
+def registered_service_names(checker):
+    names = set()
+    for relative in code_files(checker):
+        text = checker.read(relative)
+        for argument in re.findall(r"AServiceManager_addService\s*\([^,]*,\s*([^)]+?)\s*\)", text):
+            if argument.startswith('"'):
+                names.add(argument.strip('"'))
+                continue
+            constant = re.search(r"\b" + re.escape(argument) + r'\s*\[\s*\]\s*=\s*"([^"]*)"',
+                                 text)
+            if constant:
+                names.add(constant.group(1))
+    return names
+
+
+# --- Policy --------------------------------------------------------------------------------------
+
+
+def policy_files(checker, suffix=None, name=None):
+    folder = os.path.join(checker.root, "sepolicy")
+    if not os.path.isdir(folder):
+        return []
+    return [os.path.join("sepolicy", f) for f in sorted(os.listdir(folder))
+            if (suffix and f.endswith(suffix)) or f == name]
+
+
+def without_comments(text):
+    return re.sub(r"#[^\n]*", "", text)
+
+
+def context_type(context):
+    parts = context.split(":")
+    return parts[2] if len(parts) >= 4 else None
+
+
+def check_policy_types(checker):
+    declared, used = set(), []
+    for te in policy_files(checker, suffix=".te"):
+        text = without_comments(checker.read(te))
+        for kind, body in re.findall(r"\b(type|attribute|typeattribute)\s+([^;]+);", text):
+            names = [n.strip() for n in body.split(",")]
+            if kind == "typeattribute":
+                used += [(te, n) for n in names]
+            else:
+                declared.add(names[0])
+                used += [(te, n) for n in names[1:]]
+        for macro, arguments in re.findall(r"\b(\w+)\s*\(([^)]*)\)", text):
+            names = [a.strip() for a in arguments.split(",") if a.strip()]
+            if macro in DECLARING_MACROS and names:
+                declared.add(names[0])
+            used += [(te, n) for n in names]
+        for rule in re.findall(r"\b(?:allow|dontaudit|auditallow)\s+([^;]+);", text):
+            subjects, _, _ = rule.partition(":")
+            used += [(te, n) for n in re.findall(r"[A-Za-z_]\w*", subjects)]
+    for contexts in policy_files(checker, suffix="_contexts"):
+        for line in without_comments(checker.read(contexts)).splitlines():
+            for field in line.split():
+                if field.startswith("u:"):
+                    used.append((contexts, context_type(field)))
+    for where, name in used:
+        if name not in declared and name not in PLATFORM_TYPES:
+            checker.defect(where, f"type {name} is used but not declared")
+
+
+def check_policy_paths(checker, binary_paths):
+    opened = code_paths(checker)
+    for contexts in policy_files(checker, name="file_contexts"):
+        for line in without_comments(checker.read(contexts)).splitlines():
+            fields = line.split()
+            if not fields:
+                continue
+            path = fields[0]
+            if path not in binary_paths and path not in opened:
+                checker.defect(contexts, f"{path} is neither the installed binary nor a path "
+                                         "that the code opens")
+    for contexts in policy_files(checker, name="genfs_contexts"):
+        for line in without_comments(checker.read(contexts)).splitlines():
+            fields = line.split()
+            if len(fields) < 4 or fields[0] != "genfscon":
+                continue
+            mount = {"sysfs": "/sys", "proc": "/proc"}.get(fields[1], "/" + fields[1])
+            path = mount + fields[2]
+            if path not in opened:
+                checker.defect(contexts, f"{path} is not a path that the code opens")
+
+
+def check_service_name(checker):
+    registered = registered_service_names(checker)
+    if not registered:
+        checker.defect("vyrservice", "no AServiceManager_addService call with a name found")
+    listed = set()
+    for contexts in policy_files(checker, name="vndservice_contexts"):
+        for line in without_comments(checker.read(contexts)).splitlines():
+            if line.split():
+                listed.add(line.split()[0])
+    for name in sorted(listed - registered):
+        checker.defect("sepolicy/vndservice_contexts", f"service {name} is not registered by the "
+                                                       f"code (it registers {sorted(registered)})")
+    for name in sorted(registered - listed):
+        checker.defect("sepolicy/vndservice_contexts", f"registered service {name} has no context")
+
+
+# --- init ----------------------------------------------------------------------------------------
+
+
+def check_init_scripts(checker, modules):
+    """Returns the install paths of the vendor binaries."""
+    binary_paths = set()
+    for module in modules:
+        if module["type"] != "cc_binary":
+            continue
+        props = module["props"]
+        if props.get("vendor") is not True:
+            checker.defect(module["file"], f"cc_binary {props.get('name')} is not vendor: true")
+            continue
+        install_path = VENDOR_BIN + props.get("name", "")
+        binary_paths.add(install_path)
+        for rc in props.get("init_rc", []):
+            rc_path = os.path.join(module["dir"], rc)
+            if not checker.exists(rc_path):
+                checker.defect(module["file"], f"init_rc {rc_path} does not exist")
+                continue
+            check_rc(checker, rc_path, install_path)
+    return binary_paths
+
+
+def check_rc(checker, rc_path, install_path):
+    services = {}
+    current = None
+    for line in without_comments(checker.read(rc_path)).splitlines():
+        fields = line.split()
+        if not fields:
+            continue
+        if not line[:1].isspace():
+            current = None
+            if fields[0] == "service":
+                current = fields[1] if len(fields) > 1 else ""
+                services[current] = {"path": fields[2] if len(fields) > 2 else "", "options": {}}
+        elif current is not None:
+            services[current]["options"][fields[0]] = fields[1:]
+    if not services:
+        checker.defect(rc_path, "no service stanza")
+    for name, service in services.items():
+        options = service["options"]
+        if service["path"] != install_path:
+            checker.defect(rc_path, f"service {name} runs {service['path']}, but Android.bp "
+                                    f"installs the binary at {install_path}")
+        if "oneshot" in options:
+            checker.defect(rc_path, f"service {name} is oneshot: init would not restart it")
+        if options.get("user", ["root"])[0] == "root":
+            checker.defect(rc_path, f"service {name} runs as root")
+        if options.get("capabilities") != []:
+            checker.defect(rc_path, f"service {name} does not drop every capability")
+
+
+# --- Sources -------------------------------------------------------------------------------------
+
+
+def check_sources(checker, modules, cmake_sources):
+    listed = {}
+    for module in modules:
+        for source in module["props"].get("srcs", []):
+            listed.setdefault(os.path.normpath(os.path.join(module["dir"], source)), []).append(
+                module["props"].get("name"))
+    for folder in SERVICE_FOLDERS:
+        path = os.path.join(checker.root, folder)
+        for directory, _, files in os.walk(path):
+            for name in sorted(files):
+                relative = os.path.relpath(os.path.join(directory, name), checker.root)
+                if name.endswith(".cpp") and relative not in listed:
+                    checker.defect(relative, "is in no module of Android.bp")
+    if cmake_sources is None:
+        return
+    bp_modules = {m["props"].get("name"): m for m in modules}
+    with open(cmake_sources, encoding="utf-8") as f:
+        for line in f:
+            module_name, _, sources = line.rstrip("\n").partition("\t")
+            if not module_name:
+                continue
+            host = {os.path.relpath(s, checker.root) if os.path.isabs(s) else s
+                    for s in sources.split(";") if s}
+            module = bp_modules.get(module_name)
+            if module is None:
+                checker.defect("Android.bp", f"the host build's {module_name} has no module")
+                continue
+            device = {os.path.normpath(os.path.join(module["dir"], s))
+                      for s in module["props"].get("srcs", [])}
+            for source in sorted(host - device):
+                checker.defect(source, f"is built into {module_name} on the host only")
+            for source in sorted(device - host):
+                checker.defect(source, f"is built into {module_name} on the device only")
+
+
+def check_host_only(checker, modules):
+    for folder in HOST_ONLY:
+        for directory, _, files in os.walk(os.path.join(checker.root, folder)):
+            if "Android.bp" in files:
+                checker.defect(os.path.relpath(os.path.join(directory, "Android.bp"), checker.root),
+                               "a host-only folder must stay out of the device build")
+    for module in modules:
+        for value in strings_in(module["props"]):
+            target = os.path.normpath(os.path.join(module["dir"], value))
+            if any(target == f or target.startswith(f + "/") for f in HOST_ONLY):
+                checker.defect(module["file"], f"{module['props'].get('name')} reaches the "
+                                               f"host-only {target}")
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("root")
+    parser.add_argument("--cmake-sources")
+    args = parser.parse_args()
+    checker = Checker(os.path.abspath(args.root))
+    modules = load_modules(checker)
+    binary_paths = check_init_scripts(checker, modules)
+    check_policy_types(checker)
+    check_policy_paths(checker, binary_paths)
+    check_service_name(checker)
+    check_sources(checker, modules, args.cmake_sources)
+    check_host_only(checker, modules)
+    for line in checker.defects:
+        print(line)
+    if checker.defects:
+        return 1
+    print(f"device files: {len(modules)} modules, policy and init script consistent with the code")
+    return 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())
