@@ -1,13 +1,10 @@
 #include <aidl/android/vyr/IVYRService.h>
 #include <android/binder_manager.h>
-#include <android/binder_parcel_utils.h>
 #include <android/binder_process.h>
 #include <gtest/gtest.h>
-#include <linux/sockios.h>
 #include <poll.h>
 #include <signal.h>
 #include <spawn.h>
-#include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
@@ -24,11 +21,10 @@
 #include <thread>
 #include <vector>
 
-#include "binder.h"
 #include "binder_test_env.h"
 #include "echo_binder.h"
 #include "frame_io.h"
-#include "parcel.h"
+#include "raw_peer.h"
 #include "test_service.h"
 #include "wire.h"
 
@@ -743,6 +739,12 @@ TEST_F(MalformedFrameTest, CallToUnknownObjectIsAnsweredDeadObject) {
 // for them.
 class PeerLimitTest : public MalformedFrameTest {
   protected:
+    std::unique_ptr<vyr_test::RawPeer> Peer() {
+        auto peer = std::make_unique<vyr_test::RawPeer>(registry_.path(), "vyr.test");
+        EXPECT_TRUE(peer->connected());
+        return peer;
+    }
+
     // Resident memory of the helper, in KiB.
     long HelperRssKib() {
         FILE* status = fopen(("/proc/" + std::to_string(pid_) + "/status").c_str(), "r");
@@ -756,102 +758,24 @@ class PeerLimitTest : public MalformedFrameTest {
         return kib;
     }
 
-    // Bytes sent on `fd` that the helper has not read yet.
-    static int Unread(int fd) {
-        int bytes = -1;
-        ioctl(fd, SIOCOUTQ, &bytes);
-        return bytes;
-    }
-
-    static void WaitForHangUp(int fd) {
+    static void WaitForHangUp(const vyr_test::RawPeer& peer) {
         auto deadline = std::chrono::steady_clock::now() + 10s;
-        while (!HungUp(fd) && std::chrono::steady_clock::now() < deadline) {
+        while (!peer.HungUp() && std::chrono::steady_clock::now() < deadline) {
             std::this_thread::sleep_for(5ms);
         }
     }
 
-    static bool HungUp(int fd) {
-        pollfd p{fd, POLLRDHUP, 0};
-        return poll(&p, 1, 0) == 1 && (p.revents & (POLLHUP | POLLRDHUP)) != 0;
-    }
-
-    // Reads frames until the reply to transaction `id`; its object table's first object.
-    static uint64_t ReplyObject(int fd, uint64_t id) {
-        vyr_binder::FrameBuffer buffer;
-        vyr_binder::Frame frame;
-        while (buffer.Fill(fd, true) == vyr_binder::FrameBuffer::Result::kFrame) {
-            buffer.Take(&frame);
-            if (frame.header.type != static_cast<uint32_t>(vyr_binder::FrameType::kReply) ||
-                frame.header.transaction_id != id) {
-                continue;
-            }
-            std::vector<vyr_binder::WireObject> objects;
-            if (!vyr_binder::DecodeObjects(frame.table.data(), frame.table.size(),
-                                           frame.header.object_count, &objects) ||
-                objects.empty()) {
-                return 0;
-            }
-            return objects[0].id;
-        }
-        return 0;
-    }
-
-    // The helper's id of the published service, asked over a raw connection.
-    static uint64_t LookUpService(int fd) {
-        AParcel* request = AParcel_create();
-        ndk::AParcel_writeString(request, std::string("vyr.test"));
-        vyr_binder::FrameHeader header{};
-        header.magic = vyr_binder::kFrameMagic;
-        header.type = static_cast<uint32_t>(vyr_binder::FrameType::kTransaction);
-        header.code = 1;  // name lookup on the process object (id 0)
-        header.transaction_id = 1;
-        header.data_size = static_cast<uint32_t>(request->data.size());
-        SendBytes(fd, &header, sizeof(header));
-        SendBytes(fd, request->data.data(), request->data.size());
-        AParcel_delete(request);
-        return ReplyObject(fd, 1);
-    }
-
-    // A call of IVYRService method `index` with int arguments, as the generated proxy would
-    // send it.
-    static std::vector<uint8_t> Call(uint64_t target, uint64_t id, uint32_t index,
-                                     const std::vector<int32_t>& args, uint32_t flags = 0) {
-        AParcel* parcel = AParcel_create();
-        AParcel_writeInt32(parcel, vyr_binder::kInterfaceTokenMarker);
-        ndk::AParcel_writeString(parcel, std::string(IVYRService::descriptor));
-        for (int32_t arg : args) AParcel_writeInt32(parcel, arg);
-        vyr_binder::FrameHeader header{};
-        header.magic = vyr_binder::kFrameMagic;
-        header.type = static_cast<uint32_t>(vyr_binder::FrameType::kTransaction);
-        header.code = FIRST_CALL_TRANSACTION + index;
-        header.flags = flags;
-        header.transaction_id = id;
-        header.target = target;
-        header.data_size = static_cast<uint32_t>(parcel->data.size());
-        std::vector<uint8_t> frame(sizeof(header) + parcel->data.size());
-        std::memcpy(frame.data(), &header, sizeof(header));
-        std::memcpy(frame.data() + sizeof(header), parcel->data.data(), parcel->data.size());
-        AParcel_delete(parcel);
-        return frame;
-    }
-    static std::vector<uint8_t> OpenCall(uint64_t target, uint64_t id) {
-        return Call(target, id, 0, {1});
-    }
-
-    // Sends calls without ever reading a reply, until `count` were sent or the helper stops
-    // taking them; the number sent.
-    static size_t SendCallsWithoutReading(int fd, uint64_t target, size_t count) {
+    // Sends Open calls without ever reading a reply, until `count` were sent or the helper
+    // stops taking them; the number sent.
+    static size_t SendCallsWithoutReading(vyr_test::RawPeer* peer, uint64_t target, size_t count) {
         size_t sent = 0;
         auto deadline = std::chrono::steady_clock::now() + 20s;
-        while (sent < count && std::chrono::steady_clock::now() < deadline) {
-            std::vector<uint8_t> frame = OpenCall(target, 100 + sent);
-            pollfd p{fd, POLLOUT, 0};
-            if (poll(&p, 1, 100) != 1 || (p.revents & POLLOUT) == 0) continue;
-            if (send(fd, frame.data(), frame.size(), MSG_NOSIGNAL) !=
-                static_cast<ssize_t>(frame.size())) {
-                break;
+        while (sent < count && std::chrono::steady_clock::now() < deadline && !peer->HungUp()) {
+            if (peer->SendCall(target, 100 + sent, IVYRService::descriptor, 0, {1}, 0, false)) {
+                ++sent;
+            } else {
+                std::this_thread::sleep_for(1ms);
             }
-            ++sent;
         }
         return sent;
     }
@@ -860,23 +784,18 @@ class PeerLimitTest : public MalformedFrameTest {
 TEST_F(PeerLimitTest, HeadersAnnouncingHugeFramesDoNotReserveMemory) {
     const long before = HelperRssKib();
     ASSERT_GT(before, 0);
-    std::vector<int> fds;
+    std::vector<std::unique_ptr<vyr_test::RawPeer>> peers;
     for (int i = 0; i < 200; ++i) {
-        int fd = ConnectRaw();
-        ASSERT_GE(fd, 0);
-        vyr_binder::FrameHeader header = Header(vyr_binder::FrameType::kTransaction);
-        header.target = 1;
-        header.data_size = vyr_binder::kMaxTransactionBytes;
-        SendBytes(fd, &header, sizeof(header));
-        fds.push_back(fd);
+        peers.push_back(Peer());
+        ASSERT_TRUE(peers.back()->SendHeaderOnly(vyr_binder::kMaxTransactionBytes));
     }
     // Every header has been read by the helper, which now waits for the rest of each frame.
     auto deadline = std::chrono::steady_clock::now() + 10s;
-    for (int fd : fds) {
-        while (Unread(fd) != 0 && std::chrono::steady_clock::now() < deadline) {
+    for (const auto& peer : peers) {
+        while (peer->Unread() != 0 && std::chrono::steady_clock::now() < deadline) {
             std::this_thread::sleep_for(1ms);
         }
-        ASSERT_EQ(Unread(fd), 0) << "the helper never read a header";
+        ASSERT_EQ(peer->Unread(), 0) << "the helper never read a header";
     }
     const long after = HelperRssKib();
     // 200 frames of 1 MiB would be 200 MiB; what arrived is 200 headers. ThreadSanitizer's
@@ -887,53 +806,45 @@ TEST_F(PeerLimitTest, HeadersAnnouncingHugeFramesDoNotReserveMemory) {
     EXPECT_LT(after - before, 16 * 1024) << before << " KiB before, " << after << " KiB after";
 #endif
     ExpectStillServing();
-    for (int fd : fds) close(fd);
 }
 
 TEST_F(PeerLimitTest, APeerThatDoesNotReadItsRepliesDelaysNobody) {
-    int fd = ConnectRaw();
-    ASSERT_GE(fd, 0);
-    const uint64_t target = LookUpService(fd);
+    auto peer = Peer();
+    const uint64_t target = peer->LookUp("vyr.test");
     ASSERT_NE(target, 0u);
     // Far more replies than a socket buffer holds, all left unread.
-    ASSERT_EQ(SendCallsWithoutReading(fd, target, 20000), 20000u);
-    ASSERT_FALSE(HungUp(fd));
+    ASSERT_EQ(SendCallsWithoutReading(peer.get(), target, 20000), 20000u);
+    ASSERT_FALSE(peer->HungUp());
     // Others are served while the stalled peer is still connected: nobody waited for it to be
     // dropped.
     for (int i = 0; i < 50; ++i) ExpectStillServing();
-    EXPECT_FALSE(HungUp(fd)) << "the stalled peer was dropped before the others were served";
-    close(fd);
+    EXPECT_FALSE(peer->HungUp()) << "the stalled peer was dropped before the others were served";
 }
 
 TEST_F(PeerLimitTest, AFloodOfOnewayCallsIsBounded) {
-    int fd = ConnectRaw();
-    ASSERT_GE(fd, 0);
-    const uint64_t target = LookUpService(fd);
+    auto peer = Peer();
+    const uint64_t target = peer->LookUp("vyr.test");
     ASSERT_NE(target, 0u);
     // The first oneway call never returns, so every later one to the object waits behind it.
-    std::vector<uint8_t> stuck = Call(target, 2, 5, {TestService::kBlockForever, 1}, FLAG_ONEWAY);
-    SendBytes(fd, stuck.data(), stuck.size());
-    for (uint64_t id = 3; id < 3000 && !HungUp(fd); ++id) {
-        std::vector<uint8_t> call = Call(target, id, 0, {1}, FLAG_ONEWAY);
-        if (send(fd, call.data(), call.size(), MSG_NOSIGNAL) != static_cast<ssize_t>(call.size())) {
-            break;
-        }
+    ASSERT_TRUE(peer->SendCall(target, 2, IVYRService::descriptor, 5,
+                               {TestService::kBlockForever, 1}, FLAG_ONEWAY));
+    for (uint64_t id = 3; id < 3000 && !peer->HungUp(); ++id) {
+        if (!peer->SendCall(target, id, IVYRService::descriptor, 0, {1}, FLAG_ONEWAY)) break;
     }
-    WaitForHangUp(fd);
-    EXPECT_TRUE(HungUp(fd)) << "queued oneway calls grow without bound";
-    close(fd);
+    WaitForHangUp(*peer);
+    EXPECT_TRUE(peer->HungUp()) << "queued oneway calls grow without bound";
+    peer.reset();
     ExpectStillServing();
 }
 
 TEST_F(PeerLimitTest, APeerWhoseUnreadRepliesPileUpIsDropped) {
-    int fd = ConnectRaw();
-    ASSERT_GE(fd, 0);
-    const uint64_t target = LookUpService(fd);
+    auto peer = Peer();
+    const uint64_t target = peer->LookUp("vyr.test");
     ASSERT_NE(target, 0u);
-    SendCallsWithoutReading(fd, target, 200000);
-    WaitForHangUp(fd);
-    EXPECT_TRUE(HungUp(fd)) << "replies pile up without bound";
-    close(fd);
+    SendCallsWithoutReading(peer.get(), target, 200000);
+    WaitForHangUp(*peer);
+    EXPECT_TRUE(peer->HungUp()) << "replies pile up without bound";
+    peer.reset();
     ExpectStillServing();
 }
 

@@ -31,6 +31,7 @@ using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 using vyr_test::ChildProcess;
+using vyr_test::ServiceProcess;
 
 constexpr int32_t kRange = 3;
 // The service waits 4 s before it registers; sanitizer builds start slower still.

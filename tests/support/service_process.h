@@ -12,7 +12,7 @@
 
 #include "child_process.h"
 
-namespace vyr_datapath {
+namespace vyr_test {
 
 class ServiceProcess {
   public:
@@ -48,7 +48,7 @@ class ServiceProcess {
 
   private:
     std::string dir_;
-    std::unique_ptr<vyr_test::ChildProcess> process_;
+    std::unique_ptr<ChildProcess> process_;
 };
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test

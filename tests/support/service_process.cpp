@@ -9,7 +9,7 @@
 #include <sstream>
 #include <thread>
 
-namespace vyr_datapath {
+namespace vyr_test {
 
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
@@ -55,7 +55,7 @@ bool ServiceProcess::Start(const std::string& binary) {
     std::map<std::string, std::string> env = ClientEnvironment();
     env["VYR_PROPERTY_FILE"] = dir_ + "/build.prop";
     env["VYR_SENSOR_STATE_FILE"] = dir_ + "/sensor_state";
-    process_ = std::make_unique<vyr_test::ChildProcess>(std::vector<std::string>{binary}, env,
+    process_ = std::make_unique<ChildProcess>(std::vector<std::string>{binary}, env,
                                                         dir_ + "/vyrservice.log");
     return process_->started();
 }
@@ -136,4 +136,4 @@ size_t ServiceProcess::LogCount(const std::string& text) const {
     return count;
 }
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test
