@@ -1,6 +1,7 @@
 #include <aidl/android/vyr/IVYRService.h>
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <signal.h>
@@ -733,6 +734,111 @@ TEST_F(MalformedFrameTest, CallToUnknownObjectIsAnsweredDeadObject) {
     EXPECT_EQ(static_cast<uint32_t>(STATUS_DEAD_OBJECT), frame.header.code);
     close(fd);
     ExpectStillServing();
+}
+
+// The dump transaction: a descriptor and arguments from the caller to the service's dump.
+class DumpTest : public MalformedFrameTest {
+  protected:
+    // Runs a dump into a pipe and returns its status; the text read is left in `text`.
+    binder_status_t Dump(const std::vector<const char*>& args, std::string* text) {
+        int fds[2];
+        EXPECT_EQ(0, pipe2(fds, O_CLOEXEC));
+        std::string read_text;
+        std::thread reader([&] { read_text = ReadAll(fds[0]); });
+        const binder_status_t status =
+            AIBinder_dump(service_->asBinder().get(), fds[1], const_cast<const char**>(args.data()),
+                          static_cast<uint32_t>(args.size()));
+        close(fds[1]);
+        reader.join();
+        close(fds[0]);
+        *text = read_text;
+        return status;
+    }
+
+    static std::string ReadAll(int fd) {
+        std::string text;
+        char buffer[4096];
+        ssize_t n;
+        while ((n = read(fd, buffer, sizeof(buffer))) > 0) text.append(buffer, n);
+        return text;
+    }
+};
+
+TEST_F(DumpTest, TheServiceWritesToTheCallersDescriptorWithItsArguments) {
+    std::string text;
+    EXPECT_EQ(STATUS_OK, Dump({"--json", "two words"}, &text));
+    EXPECT_EQ("dump: --json two words\n", text);
+    EXPECT_EQ(STATUS_OK, Dump({}, &text));
+    EXPECT_EQ("dump:\n", text);
+    ExpectStillServing();
+}
+
+TEST_F(DumpTest, BadDescriptorsAreRefusedAndTheServiceServesOn) {
+    EXPECT_EQ(STATUS_BAD_VALUE, AIBinder_dump(service_->asBinder().get(), -1, nullptr, 0));
+    int fds[2];
+    ASSERT_EQ(0, pipe(fds));
+    close(fds[0]);
+    close(fds[1]);
+    EXPECT_EQ(STATUS_BAD_VALUE, AIBinder_dump(service_->asBinder().get(), fds[1], nullptr, 0));
+    const char* null_arg[] = {nullptr};
+    ASSERT_EQ(0, pipe(fds));
+    EXPECT_EQ(STATUS_UNEXPECTED_NULL, AIBinder_dump(service_->asBinder().get(), fds[1], null_arg, 1));
+    close(fds[0]);
+    close(fds[1]);
+    ExpectStillServing();
+}
+
+TEST_F(DumpTest, AReaderThatClosesEarlyCostsTheServiceNothing) {
+    int fds[2];
+    ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
+    // The reader takes the first line and goes; the rest of the 4 MiB has nowhere to go.
+    std::thread reader([&] {
+        char buffer[16];
+        EXPECT_GT(read(fds[0], buffer, sizeof(buffer)), 0);
+        close(fds[0]);
+    });
+    const char* args[] = {"big"};
+    const binder_status_t status = AIBinder_dump(service_->asBinder().get(), fds[1], args, 1);
+    reader.join();
+    close(fds[1]);
+    EXPECT_EQ(-EPIPE, status) << "the service's write met a closed pipe";
+    ExpectStillServing();
+}
+
+TEST_F(DumpTest, ADumpRacingTheServicesDeathEndsWithTheDeathNotice) {
+    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    int cookie = 0;
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(service_->asBinder().get(), recipient.get(), &cookie));
+    int fds[2];
+    ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
+    std::string text;
+    std::atomic<bool> writing{false};
+    std::thread reader([&] {
+        char buffer[4096];
+        ssize_t n;
+        while ((n = read(fds[0], buffer, sizeof(buffer))) > 0) {
+            text.append(buffer, n);
+            writing = true;
+        }
+    });
+    // Killed once the dump has begun writing.
+    std::thread killer([&] {
+        const auto deadline = std::chrono::steady_clock::now() + 10s;
+        while (!writing && std::chrono::steady_clock::now() < deadline) {
+            std::this_thread::sleep_for(1ms);
+        }
+        kill(pid_, SIGKILL);
+    });
+    const char* args[] = {"slow"};
+    EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_dump(service_->asBinder().get(), fds[1], args, 1));
+    killer.join();
+    close(fds[1]);
+    reader.join();
+    close(fds[0]);
+    EXPECT_EQ(0u, text.rfind("dump: slow\n", 0)) << text;
+    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
+    EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookie));
+    EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_dump(service_->asBinder().get(), 1, nullptr, 0));
 }
 
 // Peers that hold the helper's resources: what they may take is bounded, and nobody else waits

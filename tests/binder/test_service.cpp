@@ -3,7 +3,9 @@
 #include <android/binder_ibinder.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <chrono>
+#include <string>
 
 namespace vyr_binder_test {
 
@@ -117,6 +119,28 @@ Event MakeEvent(int32_t handle) {
     event.value1 = -2.25f;
     event.data.assign(static_cast<size_t>(handle % 7), 0.5f);
     return event;
+}
+
+binder_status_t TestService::dump(int fd, const char** args, uint32_t num_args) {
+    std::string line = "dump:";
+    for (uint32_t i = 0; i < num_args; ++i) line += std::string(" ") + args[i];
+    line += "\n";
+    if (write(fd, line.data(), line.size()) != static_cast<ssize_t>(line.size())) {
+        return -errno;
+    }
+    const std::string mode = num_args > 0 ? args[0] : "";
+    if (mode == "big") {
+        const std::string chunk(64 * 1024, 'x');
+        for (int i = 0; i < 64; ++i) {
+            if (write(fd, chunk.data(), chunk.size()) < 0) return -errno;
+        }
+    } else if (mode == "slow") {
+        for (int i = 0; i < 1000; ++i) {
+            if (write(fd, "tick\n", 5) < 0) return -errno;
+            std::this_thread::sleep_for(std::chrono::milliseconds(10));
+        }
+    }
+    return STATUS_OK;
 }
 
 }  // namespace vyr_binder_test

@@ -18,7 +18,9 @@ using aidl::android::vyr::IEventCallback;
 
 // A small IVYRService whose results tell what it received, for round trips through the runtime.
 // Open(kQueryTorch) returns the last torch state; Close(n > 0) delivers n events to the stored
-// callback from another thread; EnableLowPower(kBlockForever, ...) never returns.
+// callback from another thread; EnableLowPower(kBlockForever, ...) never returns. Its dump writes
+// "dump:" and its arguments on one line; with the argument "big", 4 MiB after that, and with
+// "slow", a line every 10 ms for 10 s.
 class TestService : public BnVYRService {
   public:
     static constexpr int32_t kQueryTorch = -100;
@@ -36,6 +38,7 @@ class TestService : public BnVYRService {
     ndk::ScopedAStatus ConfigureParameters(int32_t handle, const std::vector<int32_t>& params,
                                            int32_t* result) override;
     ndk::ScopedAStatus SetTorchLightState(int32_t state) override;
+    binder_status_t dump(int fd, const char** args, uint32_t num_args) override;
 
     std::shared_ptr<IEventCallback> callback();
     int32_t last_torch_state() const { return torch_state_.load(); }

@@ -2,6 +2,8 @@
 
 #include <android/binder_parcel_utils.h>
 #include <poll.h>
+#include <pthread.h>
+#include <signal.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -11,6 +13,7 @@
 #include <utility>
 
 #include "call_context.h"
+#include "dump_arguments.h"
 #include "frame_io.h"
 #include "local_binder.h"
 #include "looper.h"
@@ -28,6 +31,8 @@ constexpr size_t kMaxKeyBytes = 128;
 // bytes; a peer with more is dropped.
 constexpr uint32_t kMaxCallsInFlight = 1024;
 constexpr size_t kMaxCallBytesInFlight = 16u << 20;
+// How long a frame that carries a descriptor waits for room in the socket.
+constexpr std::chrono::seconds kDescriptorSendWait{5};
 
 Looper& TheLooper() {
     return ProcessState::Get().looper();
@@ -249,7 +254,7 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
 
 bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
                       uint64_t parent, const AParcel* parcel,
-                      const std::vector<WireObject>& objects) {
+                      const std::vector<WireObject>& objects, int descriptor) {
     std::vector<uint8_t> table;
     if (!objects.empty()) EncodeObjects(objects, &table);
     FrameHeader header{};
@@ -263,18 +268,25 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
     header.transaction_id = id;
     header.target = target;
     header.parent = parent;
+    header.descriptor_count = descriptor >= 0 ? 1 : 0;
     iovec iov[3] = {
         {&header, sizeof(header)},
         {parcel == nullptr ? nullptr : const_cast<uint8_t*>(parcel->data.data()), header.data_size},
         {table.data(), table.size()},
     };
     const size_t total = sizeof(header) + header.data_size + table.size();
-    std::lock_guard<std::mutex> lock(send_mutex_);
+    std::unique_lock<std::mutex> lock(send_mutex_);
     if (send_refused_) return false;
     size_t sent = 0;
-    // Never wait for a peer: one that does not read must not hold this thread, which may be the
-    // one that other peers' calls need.
-    if (pending_out_.empty() && !SendSome(fd_, iov, 3, &sent)) return false;
+    if (descriptor >= 0) {
+        // The descriptor must go with the frame's first byte, so this frame cannot wait in the
+        // queue: the caller (a client asking for a dump) waits for room instead.
+        if (!SendFirstByteWithDescriptor(lock, iov, &sent, descriptor)) return false;
+    } else if (pending_out_.empty() && !SendSome(fd_, iov, 3, &sent)) {
+        // Never wait for a peer otherwise: one that does not read must not hold this thread,
+        // which may be the one that other peers' calls need.
+        return false;
+    }
     if (sent == total) return true;
     if (pending_out_.size() - pending_sent_ + total - sent > kMaxPendingSendBytes) {
         fprintf(stderr, "binder: dropping peer %d: it does not read (over %zu bytes unsent)\n",
@@ -298,6 +310,23 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
         TheLooper().RunTask([self] { self->FlushPending(); });
     }
     return true;
+}
+
+bool Connection::SendFirstByteWithDescriptor(std::unique_lock<std::mutex>& lock, const iovec* iov,
+                                             size_t* sent, int descriptor) {
+    const auto deadline = std::chrono::steady_clock::now() + kDescriptorSendWait;
+    while (true) {
+        if (send_refused_ || dead()) return false;
+        if (pending_out_.empty()) {
+            if (!SendSome(fd_, iov, 3, sent, descriptor)) return false;
+            if (*sent > 0) return true;
+        }
+        if (std::chrono::steady_clock::now() >= deadline) return false;
+        lock.unlock();
+        pollfd writable{fd_, POLLOUT, 0};
+        poll(&writable, 1, 10);
+        lock.lock();
+    }
 }
 
 void Connection::FlushPending() {
@@ -345,7 +374,7 @@ void Connection::CallServed(const Incoming& call) {
 }
 
 binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, const AParcel& in,
-                                     AParcel* out, binder_flags_t flags) {
+                                     AParcel* out, binder_flags_t flags, int descriptor) {
     if (in.data.size() > kMaxTransactionBytes || in.objects.size() > kMaxObjects) {
         return STATUS_FAILED_TRANSACTION;
     }
@@ -362,7 +391,8 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         if (!oneway) waiters_.emplace_back(id, &waiter);
     }
     uint64_t parent = ScopedCallContext::ParentFor(this);
-    if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects)) {
+    if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects,
+              descriptor)) {
         {
             std::lock_guard<std::mutex> lock(mutex_);
             RemoveWaiterLocked(id);
@@ -450,6 +480,7 @@ bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out)
     call->id = header.transaction_id;
     call->code = header.code;
     call->flags = header.flags;
+    call->descriptor = std::move(frame.descriptor);
     call->data.reset(new AParcel);
     if (!DecodeParcel(frame, call->data.get())) return false;
     const bool oneway = (header.flags & FLAG_ONEWAY) != 0;
@@ -521,9 +552,35 @@ void Connection::Serve(Incoming& call) {
     reply.data.reserve(kSmallParcelBytes);
     call.data->pos = 0;
     binder_status_t status =
-        call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
+        call.code == kDumpTransaction
+            ? ServeDump(call)
+            : call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
     CallServed(call);
     if ((call.flags & FLAG_ONEWAY) == 0) SendReply(call.id, status, reply);
+}
+
+binder_status_t Connection::ServeDump(Incoming& call) {
+    // As for calls: only processes of the registry's owner reach this process at all; root may
+    // dump too, as a device's shell may.
+    if (peer_uid_ != getuid() && peer_uid_ != 0) return STATUS_PERMISSION_DENIED;
+    if (call.descriptor.get() < 0) return STATUS_BAD_VALUE;
+    std::vector<std::string> args;
+    if (!ReadDumpArguments(call.data.get(), &args)) return STATUS_BAD_VALUE;
+    std::vector<const char*> argv;
+    for (const std::string& arg : args) argv.push_back(arg.c_str());
+    // A reader that went away must cost the dump an EPIPE, not the process its life.
+    sigset_t pipe_signal;
+    sigset_t old_mask;
+    sigemptyset(&pipe_signal);
+    sigaddset(&pipe_signal, SIGPIPE);
+    pthread_sigmask(SIG_BLOCK, &pipe_signal, &old_mask);
+    const binder_status_t status = call.target.get()->Dump(
+        call.descriptor.get(), argv.data(), static_cast<uint32_t>(argv.size()));
+    const timespec no_wait{};
+    while (sigtimedwait(&pipe_signal, nullptr, &no_wait) > 0) {
+    }
+    pthread_sigmask(SIG_SETMASK, &old_mask, nullptr);
+    return status;
 }
 
 void Connection::ServeContextCall(Incoming& call) {

@@ -5,6 +5,7 @@
 #include <sys/types.h>
 
 #include <atomic>
+#include <chrono>
 #include <condition_variable>
 #include <cstdint>
 #include <memory>
@@ -43,8 +44,9 @@ class Connection : public std::enable_shared_from_this<Connection> {
     uint64_t serial() const { return serial_; }
     void set_serial(uint64_t serial) { serial_ = serial; }
 
+    // A `descriptor` (not -1) travels with the call, as a dump request's output does.
     binder_status_t Transact(uint64_t target, transaction_code_t code, const AParcel& in,
-                             AParcel* out, binder_flags_t flags);
+                             AParcel* out, binder_flags_t flags, int descriptor = -1);
     // The binder the peer published under `name`, or null.
     binder_status_t Lookup(const std::string& name, ndk::SpAIBinder* binder);
 
@@ -63,6 +65,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
         uint32_t flags;
         std::unique_ptr<AParcel> data;
         ndk::SpAIBinder target;
+        ndk::ScopedFileDescriptor descriptor;  // a dump request's output
         bool drain_oneway = false;  // run the target's queued oneway calls instead
     };
     // A thread waiting for the reply to one of its transactions.
@@ -89,6 +92,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void Dispatch(std::shared_ptr<Incoming> call, bool can_serve);
     void ServeContextCall(Incoming& call);
     void Serve(Incoming& call);
+    binder_status_t ServeDump(Incoming& call);
     void Die();
 
     // Resolves the object table of a received parcel into binders.
@@ -98,7 +102,12 @@ class Connection : public std::enable_shared_from_this<Connection> {
     Waiter* FindWaiterLocked(uint64_t id) const;
     void RemoveWaiterLocked(uint64_t id);
     bool Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
-              uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects);
+              uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects,
+              int descriptor = -1);
+    // Sends the start of a frame that carries `descriptor`, waiting (a bounded time) for the
+    // queue to empty and the socket to take a byte.
+    bool SendFirstByteWithDescriptor(std::unique_lock<std::mutex>& lock, const iovec* iov,
+                                     size_t* sent, int descriptor);
     void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
     // Sends what the socket would not take at once, on a runtime thread, as the peer reads.
     void FlushPending();

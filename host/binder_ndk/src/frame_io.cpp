@@ -50,7 +50,9 @@ FrameBuffer::Result FrameBuffer::Check() const {
     FrameHeader header;
     std::memcpy(&header, buffer_.data() + begin_, sizeof(header));
     if (!ValidateHeader(header)) return Result::kMalformed;
-    return Available() >= FrameSize(header) ? Result::kFrame : Result::kNoData;
+    if (Available() < FrameSize(header)) return Result::kNoData;
+    // The descriptor came with the frame's first byte, so it is here by now.
+    return header.descriptor_count <= descriptors_.size() ? Result::kFrame : Result::kMalformed;
 }
 
 FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
@@ -73,7 +75,8 @@ FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
         if (buffer_.size() - begin_ < needed && !Resize(begin_ + needed)) {
             return Result::kOverLimit;
         }
-        ssize_t n = recv(fd, buffer_.data() + end_, buffer_.size() - end_, wait ? 0 : MSG_DONTWAIT);
+        ssize_t n = Receive(fd, wait);
+        if (n > 0 && descriptors_.size() > kMaxReceivedDescriptors) return Result::kMalformed;
         if (n > 0) {
             end_ += static_cast<size_t>(n);
             continue;
@@ -85,8 +88,39 @@ FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
     }
 }
 
+ssize_t FrameBuffer::Receive(int fd, bool wait) {
+    iovec iov{buffer_.data() + end_, buffer_.size() - end_};
+    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxReceivedDescriptors)];
+    msghdr msg{};
+    msg.msg_iov = &iov;
+    msg.msg_iovlen = 1;
+    msg.msg_control = control;
+    msg.msg_controllen = sizeof(control);
+    const ssize_t n = recvmsg(fd, &msg, MSG_CMSG_CLOEXEC | (wait ? 0 : MSG_DONTWAIT));
+    if (n < 0) return n;
+    for (cmsghdr* c = CMSG_FIRSTHDR(&msg); c != nullptr; c = CMSG_NXTHDR(&msg, c)) {
+        if (c->cmsg_level != SOL_SOCKET || c->cmsg_type != SCM_RIGHTS) continue;
+        const size_t count = (c->cmsg_len - CMSG_LEN(0)) / sizeof(int);
+        for (size_t i = 0; i < count; ++i) {
+            int received;
+            std::memcpy(&received, CMSG_DATA(c) + i * sizeof(int), sizeof(int));
+            descriptors_.emplace_back(received);
+        }
+    }
+    // Descriptors the control buffer could not hold are lost: the stream no longer matches.
+    if ((msg.msg_flags & MSG_CTRUNC) != 0) {
+        descriptors_.resize(kMaxReceivedDescriptors + 1);
+    }
+    return n;
+}
+
 void FrameBuffer::Take(Frame* frame) {
     std::memcpy(&frame->header, buffer_.data() + begin_, sizeof(FrameHeader));
+    frame->descriptor.set(-1);
+    if (frame->header.descriptor_count == 1) {
+        frame->descriptor = std::move(descriptors_.front());
+        descriptors_.pop_front();
+    }
     const uint8_t* data = buffer_.data() + begin_ + sizeof(FrameHeader);
     frame->data.assign(data, data + frame->header.data_size);
     const uint8_t* table = data + frame->header.data_size;
@@ -99,7 +133,7 @@ void FrameBuffer::Take(Frame* frame) {
     }
 }
 
-bool SendSome(int fd, const iovec* iov, int count, size_t* sent) {
+bool SendSome(int fd, const iovec* iov, int count, size_t* sent, int descriptor) {
     *sent = 0;
     iovec rest[4];
     int first = 0;
@@ -108,6 +142,16 @@ bool SendSome(int fd, const iovec* iov, int count, size_t* sent) {
         msghdr msg{};
         msg.msg_iov = rest + first;
         msg.msg_iovlen = static_cast<size_t>(count - first);
+        alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))];
+        if (descriptor >= 0 && *sent == 0) {
+            msg.msg_control = control;
+            msg.msg_controllen = sizeof(control);
+            cmsghdr* c = CMSG_FIRSTHDR(&msg);
+            c->cmsg_level = SOL_SOCKET;
+            c->cmsg_type = SCM_RIGHTS;
+            c->cmsg_len = CMSG_LEN(sizeof(int));
+            std::memcpy(CMSG_DATA(c), &descriptor, sizeof(int));
+        }
         ssize_t n = sendmsg(fd, &msg, MSG_NOSIGNAL | MSG_DONTWAIT);
         if (n < 0) {
             if (errno == EINTR) continue;

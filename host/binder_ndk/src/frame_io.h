@@ -1,9 +1,11 @@
 #pragma once
 
+#include <android/binder_auto_utils.h>
 #include <sys/uio.h>
 
 #include <cstddef>
 #include <cstdint>
+#include <deque>
 #include <vector>
 
 #include "wire.h"
@@ -15,11 +17,15 @@ struct Frame {
     FrameHeader header;
     std::vector<uint8_t> data;
     std::vector<uint8_t> table;
+    // The descriptor that came with the frame, when its header announced one.
+    ndk::ScopedFileDescriptor descriptor;
 };
 
 // Receive buffers of all connections together may hold at most this much; a connection whose
 // buffer would grow beyond it is dropped.
 constexpr size_t kMaxBufferedBytesPerProcess = 64u << 20;
+// Descriptors received and not yet taken by their frames; a peer that sends more is dropped.
+constexpr size_t kMaxReceivedDescriptors = 4;
 // Frames that a peer does not read at once wait in its connection, up to this much; a peer that
 // lets more pile up is dropped.
 constexpr size_t kMaxPendingSendBytes = 4u << 20;
@@ -49,7 +55,12 @@ class FrameBuffer {
     // Resizes the buffer within the process-wide budget; false if that would exceed it.
     bool Resize(size_t size);
 
+    // Reads what the socket has into the buffer, keeping the descriptors that come with it.
+    ssize_t Receive(int fd, bool wait);
+
     std::vector<uint8_t> buffer_;
+    // In the order they arrived, which is the order of the frames that announced them.
+    std::deque<ndk::ScopedFileDescriptor> descriptors_;
     size_t begin_ = 0;
     size_t end_ = 0;
 };
@@ -58,7 +69,8 @@ class FrameBuffer {
 size_t BufferedBytes();
 
 // Sends as much of the `count` (at most 4) buffers as the socket takes without waiting, and
-// tells how many bytes that was; false when the peer is gone.
-bool SendSome(int fd, const iovec* iov, int count, size_t* sent);
+// tells how many bytes that was; false when the peer is gone. A `descriptor` (not -1) goes with
+// the first byte sent.
+bool SendSome(int fd, const iovec* iov, int count, size_t* sent, int descriptor = -1);
 
 }  // namespace vyr_binder

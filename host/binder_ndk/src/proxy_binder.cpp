@@ -1,8 +1,11 @@
 #include "proxy_binder.h"
 
+#include <fcntl.h>
+
 #include <utility>
 
 #include "connection.h"
+#include "dump_arguments.h"
 #include "parcel.h"
 
 namespace vyr_binder {
@@ -27,9 +30,14 @@ binder_status_t ProxyBinder::Transact(transaction_code_t code, AParcel* in, APar
     return connection_->Transact(remote_id_, code, *in, out, flags);
 }
 
-binder_status_t ProxyBinder::Dump(int /*fd*/, const char** /*args*/, uint32_t /*num_args*/) {
-    // Descriptors cannot cross processes here.
-    return IsAlive() ? STATUS_INVALID_OPERATION : STATUS_DEAD_OBJECT;
+binder_status_t ProxyBinder::Dump(int fd, const char** args, uint32_t num_args) {
+    if (!IsAlive()) return STATUS_DEAD_OBJECT;
+    if (fd < 0 || fcntl(fd, F_GETFD) < 0) return STATUS_BAD_VALUE;
+    AParcel in;
+    binder_status_t status = WriteDumpArguments(&in, args, num_args);
+    if (status != STATUS_OK) return status;
+    AParcel out;
+    return connection_->Transact(remote_id_, kDumpTransaction, in, &out, 0, fd);
 }
 
 binder_status_t ProxyBinder::LinkToDeath(std::shared_ptr<DeathRecipientState> recipient,

@@ -19,7 +19,7 @@ constexpr size_t Padded(size_t size) {
 }  // namespace
 
 bool ValidateHeader(const FrameHeader& header) {
-    if (header.magic != kFrameMagic || header.reserved != 0) return false;
+    if (header.magic != kFrameMagic || header.descriptor_count > 1) return false;
     if (header.data_size > kMaxTransactionBytes || header.object_count > kMaxObjects) return false;
     size_t max_table =
         static_cast<size_t>(header.object_count) * (sizeof(ObjectEntry) + kMaxDescriptorBytes);

@@ -23,7 +23,8 @@ struct FrameHeader {
     uint32_t data_size;
     uint32_t object_count;
     uint32_t table_size;
-    uint32_t reserved;
+    // File descriptors sent with the frame's first byte (SCM_RIGHTS): 0, or 1 for a dump request.
+    uint32_t descriptor_count;
     uint64_t transaction_id;
     uint64_t target;
     // For a transaction made while serving one from the same peer: that one's id, so the peer
