@@ -212,15 +212,39 @@ void ApexUpdateListener::HandleEvent(uint32_t mask) {
 void ApexUpdateListener::CheckForUpdate() {
     std::optional<std::set<Info>> new_info = TrySlurpInfo(package_name_, info_list_path_);
     if (!new_info) {
+        NoteReload("unreadable");
         return;
     }
     auto equivalent = [](const Info& a, const Info& b) { return !(a < b) && !(b < a); };
     if (new_info->size() == current_info_.size() &&
         std::equal(current_info_.begin(), current_info_.end(), new_info->begin(), equivalent)) {
+        NoteReload("unchanged");
         return;
     }
+    NoteReload("changed");
     if (callback_) {
         callback_(current_info_, *new_info);
+        std::lock_guard<std::mutex> lock(status_mutex_);
         current_info_ = std::move(*new_info);
     }
+}
+
+void ApexUpdateListener::NoteReload(const std::string& outcome) {
+    std::function<void(const std::string&)> observer;
+    {
+        std::lock_guard<std::mutex> lock(status_mutex_);
+        ++reloads_;
+        observer = reload_observer_;
+    }
+    if (observer) observer(outcome);
+}
+
+ApexUpdateListener::Status ApexUpdateListener::GetStatus() const {
+    std::lock_guard<std::mutex> lock(status_mutex_);
+    return Status{package_name_, info_list_path_, current_info_, reloads_};
+}
+
+void ApexUpdateListener::SetReloadObserver(std::function<void(const std::string&)> observer) {
+    std::lock_guard<std::mutex> lock(status_mutex_);
+    reload_observer_ = std::move(observer);
 }

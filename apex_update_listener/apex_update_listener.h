@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <set>
 #include <string>
@@ -60,12 +61,26 @@ class ApexUpdateListener {
     static std::optional<std::set<Info>> TrySlurpInfo(const std::string& package,
                                                       const std::string& path);
 
+    // What the listener watches and last read, for a diagnostic dump; safe from any thread.
+    struct Status {
+        std::string package;
+        std::string path;
+        std::set<Info> records;
+        uint64_t reloads = 0;
+    };
+    Status GetStatus() const;
+    // Called on the listener thread after each re-read with its outcome: "unchanged",
+    // "changed" or "unreadable".
+    void SetReloadObserver(std::function<void(const std::string&)> observer);
+
   private:
     void ThreadFunction();
     // Logs one event and re-reads the list when the event calls for it.
     void HandleEvent(uint32_t mask);
     // Compares the list's records with current_info_ and reports a difference.
     void CheckForUpdate();
+    // Counts a re-read and tells the observer its outcome.
+    void NoteReload(const std::string& outcome);
 
     const std::string package_name_;
     const std::string info_list_path_;
@@ -73,6 +88,10 @@ class ApexUpdateListener {
     std::atomic<bool> running_;
     int32_t inotify_fd_;
     int32_t watch_descriptor_;
+    // Written only by the listener thread, which alone also reads it without the lock.
     std::set<Info> current_info_;
     std::thread thread_;
+    mutable std::mutex status_mutex_;
+    uint64_t reloads_ = 0;
+    std::function<void(const std::string&)> reload_observer_;
 };

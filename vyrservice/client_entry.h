@@ -54,6 +54,9 @@ struct ClientEntry {
     // The process that opened the handle, when it is not the service's own; watched so that its
     // end closes the handle even without a callback to link to.
     pid_t opener_pid = 0;
+    // For the dump: events handed to the callback, and polls answered with no new sample.
+    std::atomic<uint64_t> events_delivered{0};
+    std::atomic<uint64_t> polls_refused{0};
 };
 
 }  // namespace binder

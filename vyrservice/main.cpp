@@ -3,7 +3,9 @@
 #include <cstdlib>
 #include <memory>
 #include <set>
+#include <string>
 
+#include "apex_status_dump.h"
 #include "apex_update_listener.h"
 #include "vyrservice.h"
 
@@ -26,7 +28,16 @@ int main() {
         false, kApexInfoList);
     __android_log_print(ANDROID_LOG_INFO, kTag, "Using ApexUpdateListener: %p", listener.get());
 
-    android::vyr::binder::CreateAndRegisterService();
+    android::vyr::binder::CreateAndRegisterService(
+        [watched = listener.get()](android::vyr::binder::VYRService& service) {
+            if (watched == nullptr) return;
+            service.SetApexSection(
+                [watched] { return android::vyr::binder::ApexStatusDump(watched->GetStatus()); });
+            // The service lives for the whole process, as the listener does.
+            watched->SetReloadObserver([&service](const std::string& outcome) {
+                service.RecordEvent("APEX reload: " + outcome);
+            });
+        });
     android::vyr::binder::JoinThreadPool();
 
     // Leaving the binder pool means the service can no longer be reached.

@@ -33,6 +33,11 @@ struct ServiceModeParams {
     // Handles that have taken the current sample.
     std::set<int32_t> polled_handles;
     std::mutex data_mutex;
+    // For the dump, written by the processing loop: samples stored, those marked invalid, and
+    // when the last one was stored (steady clock, 0 before the first).
+    std::atomic<uint64_t> samples{0};
+    std::atomic<uint64_t> invalid_samples{0};
+    std::atomic<int64_t> last_sample_ns{0};
 };
 
 }  // namespace binder

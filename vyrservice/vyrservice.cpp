@@ -18,6 +18,7 @@
 #include <cstring>
 
 #include "event_conversion.h"
+#include "sensor_modes.h"
 
 namespace android {
 namespace vyr {
@@ -33,10 +34,6 @@ constexpr char kAlsProperty[] = "persist.vendor.camera.vyr_supported";
 constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_supported";
 constexpr char kServiceName[] = "vyrservice";
 
-constexpr int32_t kAlsMode = 1;
-constexpr int32_t kRangeMode = 3;
-constexpr unsigned int kAlsSensorType = 0;
-constexpr unsigned int kRangeSensorType = 1;
 constexpr uint32_t kMaxClients = 10;
 constexpr int32_t kDefaultPeriodMs = 1000;
 constexpr int32_t kMaxRecomputedPeriodMs = 5000;
@@ -86,6 +83,8 @@ VYRService::VYRService(const ServiceConfig& config)
 
     if (config.get_bool_property(kAlsProperty, false)) {
         als_sensor_ = AmbientLightSensor::Create();
+        als_presence_ = als_sensor_ != nullptr ? "present" : "absent: Create() failed";
+        NoteDisplayState("starting", "");
         display_thread_ =
             std::thread(&VYRService::MonitorDisplayStatus, this, config.display_state_path);
         if (als_sensor_ != nullptr) {
@@ -96,11 +95,13 @@ VYRService::VYRService(const ServiceConfig& config)
         }
     } else {
         als_sensor_ = nullptr;
+        als_presence_ = std::string("absent: ") + kAlsProperty + " is off";
         ALOGW("SpectralSensor::Create() returned NULL.");
     }
 
     if (config.get_bool_property(kRangeProperty, true)) {
         range_sensor_ = ubk::RangeSensor::Create();
+        range_presence_ = range_sensor_ != nullptr ? "present" : "absent: Create() failed";
         if (range_sensor_ != nullptr) {
             worker_threads_.emplace(kRangeSensorType,
                                     std::thread(&VYRService::WorkLoop, this, kRangeSensorType));
@@ -109,6 +110,7 @@ VYRService::VYRService(const ServiceConfig& config)
         }
     } else {
         range_sensor_ = nullptr;
+        range_presence_ = std::string("absent: ") + kRangeProperty + " is off";
         ALOGW("ubk::RangeSensor::Create() returned NULL.");
     }
 
@@ -225,6 +227,8 @@ ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {
         clients_.emplace(handle, std::move(entry));
         ++num_clients_;
         *result = handle;
+        RecordEvent("open handle " + std::to_string(handle) + " mode " + std::to_string(mode) +
+                    (caller > 0 ? " pid " + std::to_string(caller) : ""));
     }
     return Ok();
 }
@@ -243,6 +247,7 @@ void VYRService::CloseInternal(int32_t handle) {
     std::shared_ptr<ClientEntry> entry = std::move(it->second);
     clients_.erase(it);
     --num_clients_;
+    RecordEvent("close handle " + std::to_string(handle));
     UnlinkDeath(entry.get());
     // The notification thread stops before the callback is dropped; one that is running this
     // very call (from OnEvent) keeps the entry until it has ended.
@@ -284,6 +289,8 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
                                                             it->second, generation);
     }
     QueueForMode(entry.mode).PushAndSignal(WorkItem{true, entry.mode, handle, effective_period});
+    RecordEvent("enable handle " + std::to_string(handle) + " period " +
+                std::to_string(effective_period));
     *result = 0;
     return Ok();
 }
@@ -308,6 +315,7 @@ void VYRService::DisableInternal(int32_t handle, bool) {
     ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
     entry.Disable();
     QueueForMode(entry.mode).PushAndSignal(WorkItem{false, entry.mode, handle, 0});
+    RecordEvent("disable handle " + std::to_string(handle));
 }
 
 ndk::ScopedAStatus VYRService::EnableLowPower(int32_t handle, bool enable, int32_t* result) {
@@ -436,6 +444,7 @@ void VYRService::HandleBinderDied(AIBinder* binder) {
     const int32_t handle = it->first;
     ClientEntry& entry = *it->second;
     ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry.mode);
+    RecordEvent("death of handle " + std::to_string(handle) + " (callback)");
     AIBinder_unlinkToDeath(entry.callback_binder.get(), entry.death_recipient, nullptr);
     DisableInternal(handle, true);
     CloseInternal(handle);
@@ -455,6 +464,8 @@ void VYRService::HandleClientProcessExit(pid_t pid) {
         ALOGI("Receive binder death callback");
         ALOGI("client %d mode %d died; disable sensor and remove client handle", handle,
               clients_[handle]->mode);
+        RecordEvent("death of handle " + std::to_string(handle) + " (process " +
+                    std::to_string(pid) + ")");
         DisableInternal(handle, true);
         CloseInternal(handle);
     }
@@ -512,6 +523,7 @@ ndk::ScopedAStatus VYRService::SetTorchLightState(int32_t state) {
     LOCK_API();
     if (als_sensor_ != nullptr) {
         als_sensor_->SetTorchLightState(static_cast<unsigned char>(state));
+        torch_state_ = state;
         ALOGI("torch state changed to %d", state);
     }
     return Ok();
@@ -543,6 +555,7 @@ void VYRService::WorkLoop(unsigned int sensor_type) {
         } else {
             DisableWork(item, &params, sensor_type);
         }
+        ++queue.applied;
     }
 }
 
@@ -563,6 +576,8 @@ void VYRService::EnableWork(const WorkItem& item, ServiceModeParams* params,
     if (item.mode == kRangeMode) {
         started = range_sensor_->Init() == 0;
         range_sensor_->Enable(true);
+        range_initialized_ = started;
+        range_enabled_ = true;
     } else if (item.mode == kAlsMode) {
         if (params->enable_count == 1) {
             als_sensor_->enabled = true;
@@ -586,6 +601,7 @@ void VYRService::DisableWork(const WorkItem& item, ServiceModeParams* params,
         params->running = false;
         if (item.mode == kRangeMode) {
             range_sensor_->Enable(false);
+            range_enabled_ = false;
         } else if (item.mode == kAlsMode) {
             als_sensor_->enabled = false;
         }
@@ -607,6 +623,7 @@ void VYRService::DisableWork(const WorkItem& item, ServiceModeParams* params,
           item.mode, params->enable_count, item.handle, params->active_period.load(), sensor_type);
     if (item.mode == kRangeMode) {
         range_sensor_->Uninit();
+        range_initialized_ = false;
     }
 }
 
@@ -636,6 +653,11 @@ void VYRService::ProcessLoop(ServiceModeParams* params) {
                 params->range_data = data;
             }
             params->polled_handles.clear();
+            ++params->samples;
+            if ((mode == kAlsMode ? reading.valid : data.valid) == 0) ++params->invalid_samples;
+            params->last_sample_ns = std::chrono::duration_cast<std::chrono::nanoseconds>(
+                                         std::chrono::steady_clock::now().time_since_epoch())
+                                         .count();
         }
 
         const int64_t remaining = period - MillisSince(start);
@@ -678,12 +700,15 @@ void VYRService::MonitorDisplayStatus(const std::string& path) {
     base::unique_fd fd(open(path.c_str(), O_RDONLY | O_CLOEXEC));
     if (fd.get() < 0) {
         ALOGE("vyrservice cannot open the display state file for reading.: %s", strerror(errno));
+        NoteDisplayState("ended: cannot open " + path + ": " + strerror(errno), "");
         return;
     }
     if (als_sensor_ == nullptr) {
         ALOGE("%s: ALS sensor unavailable", __func__);
+        NoteDisplayState("ended: no light sensor", "");
         return;
     }
+    NoteDisplayState("watching " + path, "");
     bool lit = false;
     char buffer[kDisplayStateBufferSize];
     while (running_) {
@@ -698,6 +723,7 @@ void VYRService::MonitorDisplayStatus(const std::string& path) {
         const ssize_t count = read(fd.get(), buffer, sizeof(buffer));
         if (count < 0) {
             ALOGE("vyrservice failed to read display state file: %s", strerror(errno));
+            NoteDisplayState("watching " + path, std::string("read failed: ") + strerror(errno));
             if (lit) {
                 work_queues_[kAlsSensorType].PushAndSignal(
                     WorkItem{false, kAlsMode, display_handle_, 0});
@@ -709,6 +735,11 @@ void VYRService::MonitorDisplayStatus(const std::string& path) {
         const std::string state(buffer);
         const bool now_lit =
             state.find("On") != std::string::npos || state.find("HBM") != std::string::npos;
+        const std::string shown = state.substr(0, state.find_last_not_of('\n') + 1);
+        NoteDisplayState("watching " + path, shown);
+        if (now_lit != lit) {
+            RecordEvent(std::string("display ") + (now_lit ? "lit" : "dark") + ": " + shown);
+        }
         if (now_lit && !lit) {
             ALOGI("Enable sensor for display state: %s", state.c_str());
             work_queues_[kAlsSensorType].PushAndSignal(
@@ -784,6 +815,7 @@ ndk::ScopedAStatus VYRService::PollOnce(int32_t handle, Event* event, int32_t* r
         return Ok();
     }
     *result = PollInternal(handle, it->second->mode, event) ? 0 : -ENODATA;
+    if (*result != 0) ++it->second->polls_refused;
     return Ok();
 }
 
@@ -807,6 +839,7 @@ void VYRService::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
             const std::shared_ptr<IEventCallback> callback = entry->callback;
             // A failed delivery is the death handler's business, not this loop's.
             callback->OnEvent(event);
+            ++entry->events_delivered;
             if (!enabled()) {
                 break;
             }
@@ -829,10 +862,15 @@ void VYRService::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
 // Process entry.
 
 void CreateAndRegisterService() {
+    CreateAndRegisterService(nullptr);
+}
+
+void CreateAndRegisterService(const std::function<void(VYRService&)>& prepare) {
     // The service lives for the whole process whatever the registration's outcome, so that its
     // threads keep running and no exit path destroys it under them.
     static auto* const service = new std::shared_ptr<VYRService>(
         ndk::SharedRefBase::make<VYRService>(ServiceConfig::Production()));
+    if (prepare) prepare(**service);
     ndk::SpAIBinder binder = (*service)->asBinder();
     const binder_status_t status = AServiceManager_addService(binder.get(), kServiceName);
     if (status != STATUS_OK) {

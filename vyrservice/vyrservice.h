@@ -7,8 +7,10 @@
 
 #include <array>
 #include <atomic>
+#include <chrono>
 #include <cstdint>
 #include <deque>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -19,6 +21,8 @@
 #include "ambient_light_sensor.h"
 #include "client_entry.h"
 #include "client_process_watcher.h"
+#include "dump_value.h"
+#include "event_ring.h"
 #include "service_config.h"
 #include "service_mode_params.h"
 #include "ubk/range_sensor.h"
@@ -51,6 +55,15 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     ndk::ScopedAStatus ConfigureParameters(int32_t handle, const std::vector<int32_t>& params,
                                            int32_t* result) override;
     ndk::ScopedAStatus SetTorchLightState(int32_t state) override;
+
+    // `dumpsys vyrservice`: sensors, mode blocks, clients, queues, display, APEX and recent
+    // events, as text or (argument "--json") one JSON object. Waits at most 1 s for any lock and
+    // says what it could not read.
+    binder_status_t dump(int fd, const char** args, uint32_t num_args) override;
+    // Adds an entry to the dump's list of recent events.
+    void RecordEvent(std::string text);
+    // What the dump shows of the APEX update listener, which the process owns beside the service.
+    void SetApexSection(std::function<DumpValue()> section);
 
     // A consistent copy of one mode block's scheduling state, for tests and diagnostics; waits
     // for the block's worker to finish the item it is applying.
@@ -92,6 +105,18 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     void ProcessLoop(ServiceModeParams* params);
     void WaitFor(ServiceModeParams* params, int32_t ms);
     void MonitorDisplayStatus(const std::string& path);
+    // Keeps what the monitor last read, for the dump.
+    void NoteDisplayState(std::string status, const std::string& state);
+
+    // The dump, built under the locks it needs (each waited for until `deadline` at most) and
+    // written out after they are released.
+    DumpValue BuildDump(std::chrono::steady_clock::time_point deadline);
+    DumpValue DumpSensors() const;
+    DumpValue DumpModeBlock(size_t index, std::chrono::steady_clock::time_point deadline);
+    DumpValue DumpClientsLocked() const;
+    DumpValue DumpWorkQueues();
+    DumpValue DumpDisplay() const;
+    DumpValue DumpEvents() const;
 
     bool PollInternal(int32_t handle, int32_t mode, aidl::android::vyr::Event* event);
     // Holds the entry: a nested Close from OnEvent leaves it valid until the loop has ended.
@@ -135,10 +160,29 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     std::unordered_map<const DeathCookie*, std::unique_ptr<DeathLink>> death_links_
         GUARDED_BY(links_mutex_);
     std::unique_ptr<ClientProcessWatcher> process_watcher_;
+
+    // What only the dump reads. Why each sensor is absent, fixed at construction.
+    std::string als_presence_;
+    std::string range_presence_;
+    // The range sensor's power as the worker left it, and the last torch state passed on (-1
+    // before any).
+    std::atomic<bool> range_initialized_{false};
+    std::atomic<bool> range_enabled_{false};
+    std::atomic<int32_t> torch_state_{-1};
+    mutable std::mutex display_mutex_;
+    std::string display_status_ GUARDED_BY(display_mutex_) = "not started";
+    std::string display_state_ GUARDED_BY(display_mutex_);
+    std::chrono::steady_clock::time_point display_read_time_ GUARDED_BY(display_mutex_);
+    mutable std::mutex apex_mutex_;
+    std::function<DumpValue()> apex_section_ GUARDED_BY(apex_mutex_);
+    EventRing events_;
 };
 
 // Builds the production service and registers it as "vyrservice".
 void CreateAndRegisterService();
+// The same, handing the service to `prepare` before it is registered (main uses it to show the
+// APEX listener in the dump).
+void CreateAndRegisterService(const std::function<void(VYRService&)>& prepare);
 // Gives the calling thread to the binder thread pool; returns only if the pool is left.
 void JoinThreadPool();
 

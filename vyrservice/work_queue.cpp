@@ -7,6 +7,7 @@ namespace binder {
 void WorkQueue::PushAndSignal(const WorkItem& item) {
     std::lock_guard<std::mutex> lock(mutex);
     items.push_back(item);
+    if (items.size() > highest_depth) highest_depth = items.size();
     cv.notify_all();
 }
 

@@ -1,6 +1,8 @@
 #pragma once
 
+#include <atomic>
 #include <condition_variable>
+#include <cstddef>
 #include <cstdint>
 #include <deque>
 #include <mutex>
@@ -23,6 +25,10 @@ struct WorkQueue {
     std::deque<WorkItem> items;
     std::mutex mutex;
     std::condition_variable cv;
+    // For the dump: the longest the queue has been (under `mutex`), and the items the worker has
+    // applied.
+    size_t highest_depth = 0;
+    std::atomic<uint64_t> applied{0};
 
     void PushAndSignal(const WorkItem& item);
 };

@@ -26,7 +26,8 @@ ProcessStats ProcessStats::Of(pid_t pid) {
     ProcessStats stats;
     std::ifstream status(proc + "/status");
     for (std::string line; std::getline(status, line);) {
-        if (line.rfind("VmRSS:", 0) == 0) stats.rss_kib = std::strtol(line.c_str() + 6, nullptr, 10);
+        if (line.rfind("VmRSS:", 0) == 0)
+            stats.rss_kib = std::strtol(line.c_str() + 6, nullptr, 10);
     }
     stats.fds = CountEntries(proc + "/fd");
     stats.threads = CountEntries(proc + "/task");

@@ -39,7 +39,8 @@ std::shared_ptr<IVYRService> Start(ServiceProcess* process, const Options& optio
         return nullptr;
     }
     std::shared_ptr<IVYRService> service = process->WaitForService(kStartTimeout);
-    if (service == nullptr) fprintf(stderr, "the service never registered\n%s", process->Log().c_str());
+    if (service == nullptr)
+        fprintf(stderr, "the service never registered\n%s", process->Log().c_str());
     return service;
 }
 

@@ -782,7 +782,8 @@ TEST_F(DumpTest, BadDescriptorsAreRefusedAndTheServiceServesOn) {
     EXPECT_EQ(STATUS_BAD_VALUE, AIBinder_dump(service_->asBinder().get(), fds[1], nullptr, 0));
     const char* null_arg[] = {nullptr};
     ASSERT_EQ(0, pipe(fds));
-    EXPECT_EQ(STATUS_UNEXPECTED_NULL, AIBinder_dump(service_->asBinder().get(), fds[1], null_arg, 1));
+    EXPECT_EQ(STATUS_UNEXPECTED_NULL,
+              AIBinder_dump(service_->asBinder().get(), fds[1], null_arg, 1));
     close(fds[0]);
     close(fds[1]);
     ExpectStillServing();

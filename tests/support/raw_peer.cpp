@@ -45,8 +45,7 @@ bool SendFrame(int fd, const vyr_binder::FrameHeader& header, const AParcel* par
         pollfd p{fd, POLLOUT, 0};
         if (poll(&p, 1, 0) != 1 || (p.revents & POLLOUT) == 0) return false;
     }
-    return send(fd, frame.data(), frame.size(), MSG_NOSIGNAL) ==
-           static_cast<ssize_t>(frame.size());
+    return send(fd, frame.data(), frame.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(frame.size());
 }
 
 }  // namespace
@@ -102,16 +101,15 @@ bool RawPeer::SendHeaderOnly(uint32_t data_size) {
     return send(fd_, &header, sizeof(header), MSG_NOSIGNAL) == sizeof(header);
 }
 
-bool RawPeer::SendCall(uint64_t target, uint64_t id, const std::string& descriptor,
-                       uint32_t index, const std::vector<int32_t>& args, uint32_t flags,
-                       bool wait) {
+bool RawPeer::SendCall(uint64_t target, uint64_t id, const std::string& descriptor, uint32_t index,
+                       const std::vector<int32_t>& args, uint32_t flags, bool wait) {
     AParcel* parcel = AParcel_create();
     AParcel_writeInt32(parcel, vyr_binder::kInterfaceTokenMarker);
     ndk::AParcel_writeString(parcel, descriptor);
     for (int32_t arg : args) AParcel_writeInt32(parcel, arg);
     const bool sent = SendFrame(
-        fd_, Header(FIRST_CALL_TRANSACTION + index, id, target, flags, parcel->data.size()),
-        parcel, wait);
+        fd_, Header(FIRST_CALL_TRANSACTION + index, id, target, flags, parcel->data.size()), parcel,
+        wait);
     AParcel_delete(parcel);
     return sent;
 }

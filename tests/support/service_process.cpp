@@ -56,7 +56,7 @@ bool ServiceProcess::Start(const std::string& binary) {
     env["VYR_PROPERTY_FILE"] = dir_ + "/build.prop";
     env["VYR_SENSOR_STATE_FILE"] = dir_ + "/sensor_state";
     process_ = std::make_unique<ChildProcess>(std::vector<std::string>{binary}, env,
-                                                        dir_ + "/vyrservice.log");
+                                              dir_ + "/vyrservice.log");
     return process_->started();
 }
 

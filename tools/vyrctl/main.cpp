@@ -74,6 +74,10 @@ int main(int argc, char** argv) {
     } else if (command == "torch") {
         if (global.args.size() != 1) return UsageError(&err, "torch needs one value: STATE");
         if (!ParseAll(global.args, &values, &err)) return kUsageError;
+    } else if (command == "dump") {
+        if (global.args.size() > 1 || (global.args.size() == 1 && global.args[0] != "--json")) {
+            return UsageError(&err, "dump takes only --json");
+        }
     } else if (command == "shell" || command == "wait") {
         if (!global.args.empty()) return UsageError(&err, command + " takes no arguments");
     } else {
@@ -93,5 +97,6 @@ int main(int argc, char** argv) {
     if (command == "demo-view") return RunDemoView(*connection, demo, &out, &err);
     if (command == "configure") return RunConfigure(*connection, values, &out, &err);
     if (command == "torch") return RunTorch(*connection, values[0], &out, &err);
+    if (command == "dump") return RunDump(*connection, global.args, &err);
     return Shell(connection->service(), &out, &err).Run(STDIN_FILENO);
 }

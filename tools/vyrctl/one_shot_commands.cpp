@@ -1,5 +1,10 @@
 #include "one_shot_commands.h"
 
+#include <android/binder_ibinder.h>
+#include <unistd.h>
+
+#include <cstdio>
+
 #include "call_check.h"
 #include "options.h"
 #include "result_text.h"
@@ -30,6 +35,20 @@ int RunTorch(const Connection& connection, int32_t state, LineWriter* out, LineW
         return 1;
     }
     out->WriteLine("torch " + std::to_string(state) + " -> ok");
+    return 0;
+}
+
+int RunDump(const Connection& connection, const std::vector<std::string>& args, LineWriter* err) {
+    std::vector<const char*> argv;
+    for (const std::string& arg : args) argv.push_back(arg.c_str());
+    fflush(stdout);
+    const binder_status_t status =
+        AIBinder_dump(connection.service()->asBinder().get(), STDOUT_FILENO, argv.data(),
+                      static_cast<uint32_t>(argv.size()));
+    if (status != STATUS_OK) {
+        err->WriteLine("error: dump: " + DescribeStatus(ndk::ScopedAStatus::fromStatus(status)));
+        return 1;
+    }
     return 0;
 }
 

@@ -1,6 +1,6 @@
 #pragma once
 
-// Commands that make one request and leave: `configure` and `torch`.
+// Commands that make one request and leave: `configure`, `torch` and `dump`.
 
 #include <string>
 #include <vector>
@@ -14,5 +14,7 @@ namespace vyrctl {
 int RunConfigure(const Connection& connection, const std::vector<int32_t>& values, LineWriter* out,
                  LineWriter* err);
 int RunTorch(const Connection& connection, int32_t state, LineWriter* out, LineWriter* err);
+// Has the service write its dump to this program's standard output.
+int RunDump(const Connection& connection, const std::vector<std::string>& args, LineWriter* err);
 
 }  // namespace vyrctl

@@ -190,6 +190,8 @@ std::string UsageText() {
            "                             print each event of one sensor until done or Ctrl-C\n"
            "  configure V0 ... V10       send eleven control values to the range sensor\n"
            "  torch STATE                tell the light sensor the camera torch state\n"
+           "  dump [--json]              the service's state: sensors, modes, clients, queues,\n"
+           "                             display, APEX and recent events\n"
            "  demo-view [--seconds S] [--torch-at S] [--period MS]\n"
            "                             live view of both sensors side by side\n"
            "  wait                       wait until the service is registered, then exit 0\n"

@@ -391,8 +391,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         if (!oneway) waiters_.emplace_back(id, &waiter);
     }
     uint64_t parent = ScopedCallContext::ParentFor(this);
-    if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects,
-              descriptor)) {
+    if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects, descriptor)) {
         {
             std::lock_guard<std::mutex> lock(mutex_);
             RemoveWaiterLocked(id);
@@ -574,8 +573,8 @@ binder_status_t Connection::ServeDump(Incoming& call) {
     sigemptyset(&pipe_signal);
     sigaddset(&pipe_signal, SIGPIPE);
     pthread_sigmask(SIG_BLOCK, &pipe_signal, &old_mask);
-    const binder_status_t status = call.target.get()->Dump(
-        call.descriptor.get(), argv.data(), static_cast<uint32_t>(argv.size()));
+    const binder_status_t status = call.target.get()->Dump(call.descriptor.get(), argv.data(),
+                                                           static_cast<uint32_t>(argv.size()));
     const timespec no_wait{};
     while (sigtimedwait(&pipe_signal, nullptr, &no_wait) > 0) {
     }

@@ -66,7 +66,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
         std::unique_ptr<AParcel> data;
         ndk::SpAIBinder target;
         ndk::ScopedFileDescriptor descriptor;  // a dump request's output
-        bool drain_oneway = false;  // run the target's queued oneway calls instead
+        bool drain_oneway = false;             // run the target's queued oneway calls instead
     };
     // A thread waiting for the reply to one of its transactions.
     struct Waiter {
