@@ -23,6 +23,8 @@ VYR_DEBIAN_PACKAGES=(
     libgtest-dev
     libgmock-dev
     libbenchmark-dev
+    # JSON parsing in tests of the service's dump
+    nlohmann-json3-dev
     # unshare and nsenter, for the tests that run processes in their own namespaces
     util-linux
     # The fuzz preset (libFuzzer comes with clang's runtime libraries) and the format check

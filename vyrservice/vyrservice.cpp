@@ -221,14 +221,16 @@ ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {
         const int32_t handle = NewHandle();
         auto entry = std::make_shared<ClientEntry>(mode);
         const pid_t caller = AIBinder_getCallingPid();
+        std::string opened =
+            "open handle " + std::to_string(handle) + " mode " + std::to_string(mode);
         if (caller > 0 && caller != getpid() && process_watcher_->Watch(caller)) {
             entry->opener_pid = caller;
+            opened += " pid " + std::to_string(caller);
         }
         clients_.emplace(handle, std::move(entry));
         ++num_clients_;
         *result = handle;
-        RecordEvent("open handle " + std::to_string(handle) + " mode " + std::to_string(mode) +
-                    (caller > 0 ? " pid " + std::to_string(caller) : ""));
+        RecordEvent(std::move(opened));
     }
     return Ok();
 }

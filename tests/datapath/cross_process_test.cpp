@@ -15,12 +15,14 @@
 #include <iterator>
 #include <map>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <set>
 #include <thread>
 #include <vector>
 
 #include "child_process.h"
 #include "recording_callback.h"
+#include "service_dump.h"
 #include "service_process.h"
 
 namespace vyr_datapath {
@@ -53,6 +55,13 @@ size_t JsonArrayLength(const std::string& json, const std::string& key) {
     size_t end = json.find(']', begin);
     if (end == std::string::npos || end == begin) return 0;
     return static_cast<size_t>(std::count(json.begin() + begin, json.begin() + end, ',')) + 1;
+}
+
+// A handle as the worker's log lines print it.
+std::string HexOf(const std::string& handle) {
+    char text[16];
+    snprintf(text, sizeof(text), "%x", static_cast<unsigned>(std::atoi(handle.c_str())));
+    return text;
 }
 
 bool ExitedWith(const std::optional<int>& status, int code) {
@@ -313,6 +322,46 @@ TEST_F(CrossProcessTest, DeathOfAClosedClientChangesNothing) {
     service_->Disable(survivor);
     service_->Close(survivor);
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+TEST_F(CrossProcessTest, DumpShowsTwoClientsAndTheDeathOfOne) {
+    auto first = Vyrctl({"shell"});
+    auto second = Vyrctl({"shell"});
+    const std::string a = OpenInShell(first.get());
+    const std::string b = OpenInShell(second.get());
+    ASSERT_EQ(ShellCommand(first.get(), "enable " + a + " 300"), "0");
+    ASSERT_EQ(ShellCommand(second.get(), "enable " + b + " 120"), "0");
+    ASSERT_TRUE(
+        process_->WaitForLog("handle:" + HexOf(b) + " sampling/active period 120/120", kWait));
+
+    // As a person would ask for it: vyrctl dump --json, whose output must parse.
+    auto dumper = Vyrctl({"dump", "--json"});
+    std::string output;
+    while (std::optional<std::string> line = dumper->ReadLine(kWait)) output += *line + "\n";
+    ASSERT_TRUE(ExitedWith(dumper->Wait(kWait), 0));
+    const nlohmann::json dump = nlohmann::json::parse(output);
+    const nlohmann::json& block = dump["modes"][2];
+    EXPECT_EQ(block["active_period_ms"], 120);
+    EXPECT_EQ(block["periods_ms"][a], 300);
+    EXPECT_EQ(block["periods_ms"][b], 120);
+    std::map<std::string, nlohmann::json> clients;
+    for (const auto& client : dump["clients"]) clients[client["handle"].dump()] = client;
+    ASSERT_EQ(clients.count(a), 1u) << output;
+    EXPECT_EQ(clients[a]["pid"], first->pid());
+    EXPECT_EQ(clients[b]["period_ms"], 120);
+
+    KillClient(second.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(b), kWait));
+    const vyr_test::DumpResult after = vyr_test::DumpOf(service_->asBinder().get());
+    ASSERT_EQ(after.status, STATUS_OK);
+    EXPECT_NE(after.text.find("event: death of handle " + b + " (process " +
+                              std::to_string(second->pid()) + ")\n"),
+              std::string::npos)
+        << after.text;
+    EXPECT_EQ(after.text.find("handle: " + b + "\n"), std::string::npos) << "still listed";
+    EXPECT_NE(after.text.find("handle: " + a + "\n"), std::string::npos);
+    ASSERT_EQ(ShellCommand(first.get(), "disable " + a), "ok");
+    ShellCommand(first.get(), "close " + a);
 }
 
 TEST_F(CrossProcessTest, KilledPollOnlyClientIsDisabledAndClosed) {

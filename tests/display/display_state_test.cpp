@@ -1,6 +1,7 @@
 #include <unistd.h>
 
 #include "display_fixture.h"
+#include "service_dump.h"
 
 namespace vyr_display_test {
 namespace {
@@ -40,6 +41,26 @@ TEST_F(DisplayStateTest, OnWithNewlineEnablesTheLightModeForTheDisplay) {
     ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
     EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000), kWait));
     EXPECT_FALSE(service_->SnapshotModeBlock(kAlsBlock).running);
+}
+
+TEST_F(DisplayStateTest, DumpShowsTheLastPanelStateAndItsChanges) {
+    MakeService();
+    ASSERT_TRUE(WaitForMonitorWatching(true));
+    Panel("On");
+    ASSERT_TRUE(WaitForEnableLine("On\n"));
+    std::string text = vyr_test::DumpOf(service_->asBinder().get()).text;
+    EXPECT_NE(text.find("  monitor: watching " + std::string(kStatePath) + "\n"), std::string::npos)
+        << text;
+    EXPECT_NE(text.find("  last_state: On\n"), std::string::npos) << text;
+    EXPECT_NE(text.find("event: display lit: On\n"), std::string::npos) << text;
+    EXPECT_NE(text.find("    display: 1000\n"), std::string::npos) << "the display's period";
+
+    Panel("Off");
+    ASSERT_TRUE(WaitForDisableLine("Off\n"));
+    text = vyr_test::DumpOf(service_->asBinder().get()).text;
+    EXPECT_NE(text.find("  last_state: Off\n"), std::string::npos) << text;
+    EXPECT_NE(text.find("event: display dark: Off\n"), std::string::npos) << text;
+    EXPECT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
 }
 
 TEST_F(DisplayStateTest, HbmIsLit) {

@@ -164,6 +164,10 @@ TEST(OptionsTest, GlobalTimeoutAnywhere) {
     EXPECT_FALSE(ParseGlobalOptions({"--timeout", "x", "shell"}, &none, &error));
 }
 
+TEST(OptionsTest, UsageListsDump) {
+    EXPECT_NE(UsageText().find("\n  dump [--json]  "), std::string::npos) << UsageText();
+}
+
 TEST(EventFormatTest, FloatsReadBackExactly) {
     EXPECT_EQ(FormatFloat(0.1f), "0.1");
     EXPECT_EQ(FormatFloat(4294967295.0f), "4.2949673e+09");
