@@ -25,6 +25,7 @@ PLATFORM_TYPES = {
     "apex_info_file",
     "apex_mnt_dir",
     "domain",
+    "dumpstate",
     "exec_type",
     "file_type",
     "fs_type",
