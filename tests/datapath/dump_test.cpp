@@ -130,12 +130,25 @@ TEST_F(DumpTest, CountsSamplesInvalidSamplesRefusedPollsAndDeliveries) {
     EXPECT_EQ(Poll(poller, &event), -61) << "already taken";
     sensor_doubles::SetRangeData(Frame(2));
     EnableOk(pushed, 1);
-    PublishNextSample();
-    ASSERT_TRUE(callback->WaitForEvents(1, kWait));
+    // Valid samples, one at a time, until the callback has had one.
+    int published = 1;
+    while (published < 50 && callback->Count() == 0) {
+        PublishNextSample();
+        ++published;
+        callback->WaitForEvents(1, std::chrono::milliseconds(100));
+    }
+    ASSERT_EQ(callback->Count(), 1u);
 
-    const json dump = Json();
+    // The delivery is counted once OnEvent has returned.
+    const auto deadline = std::chrono::steady_clock::now() + kWait;
+    json dump = Json();
+    while (ClientOf(dump, pushed)["events_delivered"] != 1 &&
+           std::chrono::steady_clock::now() < deadline) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(2));
+        dump = Json();
+    }
     const json& block = dump["modes"][kRangeBlock];
-    EXPECT_EQ(block["samples"], 2);
+    EXPECT_EQ(block["samples"], published);
     EXPECT_EQ(block["invalid_samples"], 1);
     EXPECT_TRUE(block["last_sample_age_ms"].is_number());
     EXPECT_EQ(ClientOf(dump, poller)["polls_refused"], 2);

@@ -116,7 +116,7 @@ TEST_F(DeviceFilesTest, TheCopyPassesUnchanged) {
 }
 
 TEST_F(DeviceFilesTest, AnAndroidBpThatBpfmtWouldReformatFails) {
-    Edit("vyrservice/Android.bp", "    srcs: [\"main.cpp\"],\n", "    srcs: [ \"main.cpp\" ],\n");
+    Edit("vyrservice/Android.bp", "    vendor: true,\n", "    vendor:true,\n");
     EXPECT_FAILS_WITH(CheckCopy(), "vyrservice/Android.bp is not formatted");
 }
 
