@@ -4,8 +4,6 @@
 #include <sys/eventfd.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <chrono>
 #include <cstdint>
 #include <utility>
 
@@ -16,9 +14,6 @@ namespace {
 
 constexpr uint64_t kWorkTag = UINT64_MAX;
 constexpr uint64_t kStopTag = UINT64_MAX - 1;
-
-// How often a parked pool thread checks that someone still reads the sockets.
-constexpr std::chrono::milliseconds kStandbyTick(5);
 
 thread_local bool t_runtime_thread = false;
 
@@ -95,7 +90,6 @@ void Looper::Enqueue(std::function<void()> work) {
     queue_.push_back(std::move(work));
     if (!HaveExecutorsLocked()) return;
     ArmWorkLocked();
-    if (!parked_.empty()) parked_.back()->notify_one();
     SpawnIfAllBusyLocked();
 }
 
@@ -155,10 +149,9 @@ void Looper::Run(Kind kind) {
             --serving_;
             continue;
         }
-        if (executor && idle_executors_ > 0) {
-            Park(lock);
-            continue;
-        }
+        // Every idle thread waits in epoll. Its waiters are woken one per event, the one that
+        // began waiting last first: the thread that served the last call serves the next, and
+        // an idle process has no thread that wakes.
         if (executor) ++idle_executors_;
         lock.unlock();
         epoll_event event{};
@@ -185,24 +178,6 @@ void Looper::Run(Kind kind) {
     }
     // A thread that joined the pool goes back to being an ordinary thread.
     if (kind == Kind::kJoined) t_runtime_thread = false;
-}
-
-void Looper::Park(std::unique_lock<std::mutex>& lock) {
-    std::condition_variable cv;
-    parked_.push_back(&cv);
-    for (;;) {
-        if (stopping_ || !queue_.empty() || idle_executors_ == 0) break;
-        // The most recently parked thread stands by: it looks every tick whether the watcher
-        // left to serve a call, so a call that blocks never keeps the sockets unread for long.
-        if (parked_.back() == &cv) {
-            cv.wait_for(lock, kStandbyTick);
-        } else {
-            cv.wait(lock);
-        }
-    }
-    bool was_standby = parked_.back() == &cv;
-    parked_.erase(std::find(parked_.begin(), parked_.end(), &cv));
-    if (was_standby && !parked_.empty()) parked_.back()->notify_one();
 }
 
 void Looper::Add(const std::shared_ptr<Connection>& connection) {
@@ -260,7 +235,6 @@ void Looper::Shutdown() {
         uint64_t one = 1;
         ssize_t written = write(stop_fd_, &one, sizeof(one));
         (void)written;
-        for (std::condition_variable* parked : parked_) parked->notify_one();
         threads.swap(threads_);
         tasks.swap(tasks_);
         dropped.swap(queue_);

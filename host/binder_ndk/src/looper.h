@@ -18,8 +18,9 @@ class Connection;
 //
 // Runtime threads wait in one epoll set; the one woken for a connection reads one frame, lets
 // the next reader in, and then serves a call in that frame itself, so a call costs no hand-over
-// between threads. One idle pool thread watches the sockets, the others park: the thread that
-// served the last call serves the next one, warm, instead of the pool taking turns. The looper
+// between threads. Idle threads all wait in epoll, which wakes the one that began waiting last:
+// the thread that served the last call serves the next one, warm, instead of the pool taking
+// turns, and no thread wakes while nothing happens. The looper
 // thread exists from the first connection on; until the pool is started (or a thread joins it) it
 // handles replies, reference counts and deaths but leaves incoming calls queued, as a device
 // process without a thread pool would.
@@ -67,8 +68,6 @@ class Looper {
     enum class Kind { kLooper, kPool, kJoined };
 
     void Run(Kind kind);
-    // Waits while another pool thread watches the sockets and there is no queued work.
-    void Park(std::unique_lock<std::mutex>& lock);
     void SpawnLocked(Kind kind);
     void ArmWorkLocked();
     bool HaveExecutorsLocked() const { return started_ || joined_ > 0; }
@@ -89,9 +88,8 @@ class Looper {
     uint64_t next_serial_ = 1;
     uint32_t max_threads_ = kDefaultMaxThreads;
     uint32_t spawned_ = 0;
-    uint32_t idle_executors_ = 0;                   // waiting in epoll
-    std::vector<std::condition_variable*> parked_;  // most recently parked last
-    uint32_t serving_ = 0;                          // running a call or queued work
+    uint32_t idle_executors_ = 0;  // waiting in epoll
+    uint32_t serving_ = 0;         // running a call or queued work
     uint32_t joined_ = 0;
     bool looper_running_ = false;
     bool started_ = false;
