@@ -125,11 +125,7 @@ VYRService::~VYRService() {
         display_thread_.join();
     }
     for (auto& [sensor_type, thread] : worker_threads_) {
-        WorkQueue& queue = work_queues_[sensor_type];
-        {
-            std::lock_guard<std::mutex> lock(queue.mutex);
-            queue.cv.notify_all();
-        }
+        work_queues_[sensor_type].WakeAll();
         if (thread.joinable()) {
             thread.join();
         }
@@ -537,27 +533,19 @@ void VYRService::WorkLoop(unsigned int sensor_type) {
     WorkQueue& queue = work_queues_[sensor_type];
     std::mutex& sensor_lock = sensor_locks_[sensor_type];
     while (running_) {
-        {
-            std::unique_lock<std::mutex> lock(queue.mutex);
-            queue.cv.wait(lock, [&] { return !queue.items.empty() || !running_; });
-        }
-        if (!running_) {
+        const std::optional<WorkItem> item = queue.WaitAndPop(running_);
+        if (!item) {
             return;
         }
-        WorkItem item;
-        {
-            std::lock_guard<std::mutex> lock(queue.mutex);
-            item = queue.items.front();
-            queue.items.pop_front();
-        }
+        // The queue's mutex is released: a worker never holds it with its sensor lock.
         std::lock_guard<std::mutex> lock(sensor_lock);
-        ServiceModeParams& params = ParamsForMode(item.mode);
-        if (item.enable) {
-            EnableWork(item, &params, sensor_type);
+        ServiceModeParams& params = ParamsForMode(item->mode);
+        if (item->enable) {
+            EnableWork(*item, &params, sensor_type);
         } else {
-            DisableWork(item, &params, sensor_type);
+            DisableWork(*item, &params, sensor_type);
         }
-        ++queue.applied;
+        queue.CountApplied();
     }
 }
 

@@ -178,15 +178,12 @@ DumpValue VYRService::DumpClientsLocked() const {
 DumpValue VYRService::DumpWorkQueues() {
     DumpValue queues = DumpValue::Array();
     for (unsigned int sensor_type = 0; sensor_type < work_queues_.size(); ++sensor_type) {
-        WorkQueue& queue = work_queues_[sensor_type];
+        const WorkQueue& queue = work_queues_[sensor_type];
         DumpValue& shown = queues.Append(DumpValue::Object());
         shown.Set("sensor_type", sensor_type);
-        {
-            std::lock_guard<std::mutex> lock(queue.mutex);
-            shown.Set("depth", static_cast<uint64_t>(queue.items.size()));
-            shown.Set("highest_depth", static_cast<uint64_t>(queue.highest_depth));
-        }
-        shown.Set("applied", queue.applied.load());
+        shown.Set("depth", static_cast<uint64_t>(queue.Depth()));
+        shown.Set("highest_depth", static_cast<uint64_t>(queue.HighestDepth()));
+        shown.Set("applied", queue.Applied());
     }
     return queues;
 }

@@ -1,11 +1,14 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
+
 #include <atomic>
 #include <condition_variable>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
 #include <mutex>
+#include <optional>
 
 namespace android {
 namespace vyr {
@@ -21,16 +24,28 @@ struct WorkItem {
 };
 
 // The unbounded FIFO between the producers (binder threads, display monitor) and one worker.
-struct WorkQueue {
-    std::deque<WorkItem> items;
-    std::mutex mutex;
-    std::condition_variable cv;
-    // For the dump: the longest the queue has been (under `mutex`), and the items the worker has
-    // applied.
-    size_t highest_depth = 0;
-    std::atomic<uint64_t> applied{0};
+class WorkQueue {
+  public:
+    void PushAndSignal(const WorkItem& item) EXCLUDES(mutex_);
+    // Waits until there is an item or `running` is false; the front item, or nothing once
+    // `running` is false (what is queued then stays).
+    std::optional<WorkItem> WaitAndPop(const std::atomic<bool>& running) EXCLUDES(mutex_);
+    // Wakes the worker so that it sees `running` false.
+    void WakeAll() EXCLUDES(mutex_);
+    // Counts an item the worker has applied.
+    void CountApplied() { applied_.fetch_add(1, std::memory_order_relaxed); }
 
-    void PushAndSignal(const WorkItem& item);
+    // For the dump.
+    size_t Depth() const EXCLUDES(mutex_);
+    size_t HighestDepth() const EXCLUDES(mutex_);
+    uint64_t Applied() const { return applied_.load(std::memory_order_relaxed); }
+
+  private:
+    std::deque<WorkItem> items_ GUARDED_BY(mutex_);
+    mutable std::mutex mutex_;
+    std::condition_variable cv_;
+    size_t highest_depth_ GUARDED_BY(mutex_) = 0;
+    std::atomic<uint64_t> applied_{0};
 };
 
 }  // namespace binder
