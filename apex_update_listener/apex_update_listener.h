@@ -1,5 +1,7 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
+
 #include <atomic>
 #include <cstdint>
 #include <functional>
@@ -92,6 +94,6 @@ class ApexUpdateListener {
     std::set<Info> current_info_;
     std::thread thread_;
     mutable std::mutex status_mutex_;
-    uint64_t reloads_ = 0;
-    std::function<void(const std::string&)> reload_observer_;
+    uint64_t reloads_ GUARDED_BY(status_mutex_) = 0;
+    std::function<void(const std::string&)> reload_observer_ GUARDED_BY(status_mutex_);
 };

@@ -13,3 +13,8 @@ endforeach()
 set_property(TARGET android::base APPEND PROPERTY INTERFACE_LINK_LIBRARIES android::log)
 list(APPEND CMAKE_BUILD_RPATH ${ANDROID_LIB_DIR})
 list(APPEND CMAKE_INSTALL_RPATH ${ANDROID_LIB_DIR})
+
+# libbase's header-only parts (thread annotations) for code that links no libbase.
+add_library(android::base_headers INTERFACE IMPORTED)
+set_target_properties(android::base_headers PROPERTIES
+    INTERFACE_INCLUDE_DIRECTORIES ${ANDROID_INCLUDE_DIR})

@@ -30,6 +30,9 @@ VYR_DEBIAN_PACKAGES=(
     # The fuzz preset (libFuzzer comes with clang's runtime libraries) and the format check
     clang
     libclang-rt-14-dev
+    # clang's thread-safety analysis needs libc++, whose mutexes carry its annotations
+    libc++-14-dev
+    libc++abi-14-dev
     clang-format
 )
 

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
+
 #include <atomic>
 #include <condition_variable>
 #include <cstdint>
@@ -17,7 +19,8 @@ namespace binder {
 
 // The sampling state of one sensor mode. The worker of the mode's sensor type changes it under
 // its sensor lock; the processing loop reads `mode` and `active_period` once a cycle without
-// that lock, hence the atomics.
+// that lock, hence the atomics. `periods` and `enable_count` are guarded by that sensor lock,
+// which the service owns (one per worker, not per block), so no annotation here can name it.
 struct ServiceModeParams {
     std::atomic<bool> running{false};
     // Handle to the sampling period it asked for, in milliseconds.
@@ -28,16 +31,21 @@ struct ServiceModeParams {
     std::thread process_thread;
     std::condition_variable wait_cv;
     std::mutex wait_mutex;
-    MultiRangingData range_data{};
-    ALSResult als_data{};
+    MultiRangingData range_data GUARDED_BY(data_mutex){};
+    ALSResult als_data GUARDED_BY(data_mutex){};
     // Handles that have taken the current sample.
-    std::set<int32_t> polled_handles;
+    std::set<int32_t> polled_handles GUARDED_BY(data_mutex);
     std::mutex data_mutex;
     // For the dump, written by the processing loop: samples stored, those marked invalid, and
     // when the last one was stored (steady clock, 0 before the first).
     std::atomic<uint64_t> samples{0};
     std::atomic<uint64_t> invalid_samples{0};
     std::atomic<int64_t> last_sample_ns{0};
+    // `enable_count` and `periods` as the worker left them after its last item, for the dump:
+    // it never waits for a worker that may be joining a sampling thread.
+    std::mutex shown_mutex;
+    int32_t shown_enable_count GUARDED_BY(shown_mutex) = 0;
+    std::unordered_map<int32_t, int32_t> shown_periods GUARDED_BY(shown_mutex);
 };
 
 }  // namespace binder

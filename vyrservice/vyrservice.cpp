@@ -50,8 +50,8 @@ constexpr size_t kDisplayStateBufferSize = 50;
 #define ALOGE(...) ALOG(ANDROID_LOG_ERROR, __VA_ARGS__)
 
 // A call that waits this long for another one ends the service: something is stuck for good.
-#define LOCK_API()                                                               \
-    std::unique_lock<std::timed_mutex> lck(api_lock_, std::chrono::seconds(10)); \
+#define LOCK_API()                                         \
+    ApiLockGuard lck(api_lock_, std::chrono::seconds(10)); \
     CHECK(lck.owns_lock())
 
 ndk::ScopedAStatus Ok() {
@@ -544,6 +544,11 @@ void VYRService::WorkLoop(unsigned int sensor_type) {
             EnableWork(*item, &params, sensor_type);
         } else {
             DisableWork(*item, &params, sensor_type);
+        }
+        {
+            std::lock_guard<std::mutex> shown(params.shown_mutex);
+            params.shown_enable_count = params.enable_count;
+            params.shown_periods = params.periods;
         }
         queue.CountApplied();
     }

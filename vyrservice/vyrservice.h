@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "ambient_light_sensor.h"
+#include "api_lock.h"
 #include "client_entry.h"
 #include "client_process_watcher.h"
 #include "dump_value.h"
@@ -83,21 +84,21 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     size_t DeathLinkCount();
 
   private:
-    int32_t NewHandle();
+    int32_t NewHandle() REQUIRES(api_lock_);
     ServiceModeParams& ParamsForMode(int32_t mode);
     WorkQueue& QueueForMode(int32_t mode);
 
-    void CloseInternal(int32_t handle);
-    void DisableInternal(int32_t handle, bool);
-    void HandleBinderDied(AIBinder* binder);
+    void CloseInternal(int32_t handle) REQUIRES(api_lock_);
+    void DisableInternal(int32_t handle, bool) REQUIRES(api_lock_);
+    void HandleBinderDied(AIBinder* binder) EXCLUDES(api_lock_);
     static void OnBinderDied(void* cookie);
     static void OnDeathLinkUnlinked(void* cookie);
     // Removes the entry's death link, so that its cookie can be given back.
-    void UnlinkDeath(ClientEntry* entry);
+    void UnlinkDeath(ClientEntry* entry) REQUIRES(api_lock_);
     // Frees the links that the runtime has let go of; called with the API lock held.
-    void SweepDeathLinks() EXCLUDES(links_mutex_);
+    void SweepDeathLinks() REQUIRES(api_lock_) EXCLUDES(links_mutex_);
     // Disables and closes every client that the ended process opened, as a death notice does.
-    void HandleClientProcessExit(pid_t pid);
+    void HandleClientProcessExit(pid_t pid) EXCLUDES(api_lock_);
 
     void WorkLoop(unsigned int sensor_type);
     void EnableWork(const WorkItem& item, ServiceModeParams* params, unsigned int sensor_type);
@@ -108,12 +109,12 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // Keeps what the monitor last read, for the dump.
     void NoteDisplayState(std::string status, const std::string& state);
 
-    // The dump, built under the locks it needs (each waited for until `deadline` at most) and
-    // written out after they are released.
-    DumpValue BuildDump(std::chrono::steady_clock::time_point deadline);
+    // The dump, built under the locks it needs (the API lock waited for until `deadline` at
+    // most, the others held only briefly by anyone) and written out after they are released.
+    DumpValue BuildDump(std::chrono::steady_clock::time_point deadline) EXCLUDES(api_lock_);
     DumpValue DumpSensors() const;
-    DumpValue DumpModeBlock(size_t index, std::chrono::steady_clock::time_point deadline);
-    DumpValue DumpClientsLocked() const;
+    DumpValue DumpModeBlock(size_t index);
+    DumpValue DumpClientsLocked() const REQUIRES(api_lock_);
     DumpValue DumpWorkQueues();
     DumpValue DumpDisplay() const;
     DumpValue DumpEvents() const;
@@ -143,9 +144,13 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     int32_t range_params_index_ = 2;
     // Block 1 is served by no mode; only blocks 0 and 2 are ever selected.
     std::array<ServiceModeParams, 3> mode_params_;
-    std::timed_mutex api_lock_;
+    // Taken before a queue's mutex and before a client's notify_mutex (through the join), never
+    // after them. The order is not declared (ACQUIRED_BEFORE): the analysis checks orders only
+    // with -Wthread-safety-beta and cannot name the per-worker sensor locks or the per-client
+    // mutexes, which live in arrays and entries.
+    ApiLock api_lock_;
     std::array<std::mutex, 2> sensor_locks_;
-    std::unordered_map<int32_t, std::shared_ptr<ClientEntry>> clients_;
+    std::unordered_map<int32_t, std::shared_ptr<ClientEntry>> clients_ GUARDED_BY(api_lock_);
     // -1 is never a handle, so the draw for the display handle itself excludes nothing else.
     int32_t display_handle_ = -1;
     // Read and written by nothing; kept so that the object keeps the deployed layout.

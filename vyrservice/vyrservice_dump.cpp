@@ -7,7 +7,6 @@
 #include <cstring>
 #include <map>
 
-#include "sensor_modes.h"
 #include "vyrservice.h"
 
 namespace android {
@@ -27,15 +26,6 @@ int64_t AgeMs(steady_clock::time_point then) {
 
 int64_t MonotonicMs(steady_clock::time_point time) {
     return std::chrono::duration_cast<std::chrono::milliseconds>(time.time_since_epoch()).count();
-}
-
-// Takes `mutex` by `deadline`; a plain mutex has no timed lock, so it is tried until then.
-bool LockBy(std::mutex& mutex, steady_clock::time_point deadline) {
-    while (!mutex.try_lock()) {
-        if (steady_clock::now() >= deadline) return false;
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    }
-    return true;
 }
 
 bool WriteAll(int fd, const std::string& text) {
@@ -86,9 +76,9 @@ DumpValue VYRService::BuildDump(steady_clock::time_point deadline) {
     DumpValue& api_lock = dump.Set("api_lock", "taken");
     DumpValue clients;
     {
-        std::unique_lock<std::timed_mutex> lock(api_lock_, std::defer_lock);
-        if (lock.try_lock_until(deadline)) {
+        if (api_lock_.TryLockFor(deadline - steady_clock::now())) {
             clients = DumpClientsLocked();
+            api_lock_.Unlock();
         } else {
             api_lock = "busy for " + std::to_string(kLockWait.count()) +
                        " ms: clients not shown, the rest as read without it";
@@ -97,7 +87,7 @@ DumpValue VYRService::BuildDump(steady_clock::time_point deadline) {
     dump.Set("sensors", DumpSensors());
     DumpValue& modes = dump.Set("modes", DumpValue::Array());
     for (size_t index = 0; index < mode_params_.size(); ++index) {
-        modes.Append(DumpModeBlock(index, deadline));
+        modes.Append(DumpModeBlock(index));
     }
     dump.Set("clients", std::move(clients));
     dump.Set("work_queues", DumpWorkQueues());
@@ -124,29 +114,22 @@ DumpValue VYRService::DumpSensors() const {
     return sensors;
 }
 
-DumpValue VYRService::DumpModeBlock(size_t index, steady_clock::time_point deadline) {
+DumpValue VYRService::DumpModeBlock(size_t index) {
     ServiceModeParams& params = mode_params_[index];
     DumpValue block = DumpValue::Object();
     block.Set("block", static_cast<int64_t>(index));
     block.Set("mode", params.mode.load());
     block.Set("running", params.running.load());
     block.Set("active_period_ms", params.active_period.load());
-    // The worker holds its lock while it applies an item, which may mean joining a sampling
-    // thread for up to a period.
-    std::mutex& sensor_lock =
-        sensor_locks_[static_cast<int32_t>(index) == range_params_index_ ? kRangeSensorType
-                                                                         : kAlsSensorType];
-    if (LockBy(sensor_lock, deadline)) {
-        std::lock_guard<std::mutex> lock(sensor_lock, std::adopt_lock);
-        block.Set("enable_count", params.enable_count);
+    {
+        std::lock_guard<std::mutex> lock(params.shown_mutex);
+        block.Set("enable_count", params.shown_enable_count);
         DumpValue& periods = block.Set("periods_ms", DumpValue::Object());
-        const std::map<int32_t, int32_t> sorted(params.periods.begin(), params.periods.end());
+        const std::map<int32_t, int32_t> sorted(params.shown_periods.begin(),
+                                                params.shown_periods.end());
         for (const auto& [handle, period] : sorted) {
             periods.Set(handle == display_handle_ ? "display" : std::to_string(handle), period);
         }
-    } else {
-        block.Set("enable_count", DumpValue());
-        block.Set("periods_ms", "worker busy");
     }
     block.Set("samples", params.samples.load());
     block.Set("invalid_samples", params.invalid_samples.load());

@@ -13,6 +13,7 @@ void WorkQueue::PushAndSignal(const WorkItem& item) {
 
 std::optional<WorkItem> WorkQueue::WaitAndPop(const std::atomic<bool>& running) {
     std::unique_lock<std::mutex> lock(mutex_);
+    base::ScopedLockAssertion locked(mutex_);
     cv_.wait(lock, [&]() REQUIRES(mutex_) { return !items_.empty() || !running; });
     if (!running) return std::nullopt;
     WorkItem item = items_.front();

@@ -48,6 +48,7 @@ TEST_F(DisplayStateTest, DumpShowsTheLastPanelStateAndItsChanges) {
     ASSERT_TRUE(WaitForMonitorWatching(true));
     Panel("On");
     ASSERT_TRUE(WaitForEnableLine("On\n"));
+    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
     std::string text = vyr_test::DumpOf(service_->asBinder().get()).text;
     EXPECT_NE(text.find("  monitor: watching " + std::string(kStatePath) + "\n"), std::string::npos)
         << text;

@@ -19,6 +19,7 @@
 #include "looper.h"
 #include "process_state.h"
 #include "proxy_binder.h"
+#include "unique_lock.h"
 
 namespace vyr_binder {
 namespace {
@@ -275,13 +276,13 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
         {table.data(), table.size()},
     };
     const size_t total = sizeof(header) + header.data_size + table.size();
-    std::unique_lock<std::mutex> lock(send_mutex_);
+    UniqueLock lock(send_mutex_);
     if (send_refused_) return false;
     size_t sent = 0;
     if (descriptor >= 0) {
         // The descriptor must go with the frame's first byte, so this frame cannot wait in the
         // queue: the caller (a client asking for a dump) waits for room instead.
-        if (!SendFirstByteWithDescriptor(lock, iov, &sent, descriptor)) return false;
+        if (!SendFirstByteWithDescriptor(iov, &sent, descriptor)) return false;
     } else if (pending_out_.empty() && !SendSome(fd_, iov, 3, &sent)) {
         // Never wait for a peer otherwise: one that does not read must not hold this thread,
         // which may be the one that other peers' calls need.
@@ -312,8 +313,7 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
     return true;
 }
 
-bool Connection::SendFirstByteWithDescriptor(std::unique_lock<std::mutex>& lock, const iovec* iov,
-                                             size_t* sent, int descriptor) {
+bool Connection::SendFirstByteWithDescriptor(const iovec* iov, size_t* sent, int descriptor) {
     const auto deadline = std::chrono::steady_clock::now() + kDescriptorSendWait;
     while (true) {
         if (send_refused_ || dead()) return false;
@@ -322,10 +322,11 @@ bool Connection::SendFirstByteWithDescriptor(std::unique_lock<std::mutex>& lock,
             if (*sent > 0) return true;
         }
         if (std::chrono::steady_clock::now() >= deadline) return false;
-        lock.unlock();
+        // The caller's lock is let go while waiting, so that the queue can drain.
+        send_mutex_.unlock();
         pollfd writable{fd_, POLLOUT, 0};
         poll(&writable, 1, 10);
-        lock.lock();
+        send_mutex_.lock();
     }
 }
 
@@ -402,7 +403,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
     }
     if (oneway) return STATUS_OK;
 
-    std::unique_lock<std::mutex> lock(mutex_);
+    UniqueLock lock(mutex_);
     while (!waiter.done) {
         if (!waiter.nested.empty()) {
             // The peer calls back into us while serving our call: serve it on this thread.
@@ -415,7 +416,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             continue;
         }
         if (reading_ || dead_.load(std::memory_order_relaxed)) {
-            waiter.cv.wait(lock);
+            waiter.cv.wait(lock.native());
             continue;
         }
         // Nobody is reading: read for ourselves, sparing a hand-over for our reply.

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
 #include <android/binder_auto_utils.h>
 #include <android/binder_ibinder.h>
 #include <sys/types.h>
@@ -17,6 +18,7 @@
 
 #include "frame_io.h"
 #include "parcel.h"
+#include "unique_lock.h"
 #include "wire.h"
 
 namespace vyr_binder {
@@ -97,17 +99,18 @@ class Connection : public std::enable_shared_from_this<Connection> {
 
     // Resolves the object table of a received parcel into binders.
     bool DecodeParcel(Frame& frame, AParcel* parcel);
-    binder_status_t EncodeObjectsLocked(const AParcel& parcel, std::vector<WireObject>* objects);
-    ndk::SpAIBinder ProxyForLocked(uint64_t id, const std::string& descriptor);
-    Waiter* FindWaiterLocked(uint64_t id) const;
-    void RemoveWaiterLocked(uint64_t id);
+    binder_status_t EncodeObjectsLocked(const AParcel& parcel, std::vector<WireObject>* objects)
+        REQUIRES(mutex_);
+    ndk::SpAIBinder ProxyForLocked(uint64_t id, const std::string& descriptor) REQUIRES(mutex_);
+    Waiter* FindWaiterLocked(uint64_t id) const REQUIRES(mutex_);
+    void RemoveWaiterLocked(uint64_t id) REQUIRES(mutex_);
     bool Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
               uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects,
               int descriptor = -1);
     // Sends the start of a frame that carries `descriptor`, waiting (a bounded time) for the
-    // queue to empty and the socket to take a byte.
-    bool SendFirstByteWithDescriptor(std::unique_lock<std::mutex>& lock, const iovec* iov,
-                                     size_t* sent, int descriptor);
+    // queue to empty and the socket to take a byte; lets send_mutex_ go while it waits.
+    bool SendFirstByteWithDescriptor(const iovec* iov, size_t* sent, int descriptor)
+        REQUIRES(send_mutex_);
     void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
     // Sends what the socket would not take at once, on a runtime thread, as the peer reads.
     void FlushPending();
@@ -123,25 +126,25 @@ class Connection : public std::enable_shared_from_this<Connection> {
 
     std::mutex send_mutex_;
     // Frames, or their tails, that the peer has not taken yet; sent in order before anything
-    // new. Guarded by send_mutex_.
-    std::vector<uint8_t> pending_out_;
-    size_t pending_sent_ = 0;
-    bool flushing_ = false;
+    // new.
+    std::vector<uint8_t> pending_out_ GUARDED_BY(send_mutex_);
+    size_t pending_sent_ GUARDED_BY(send_mutex_) = 0;
+    bool flushing_ GUARDED_BY(send_mutex_) = false;
     // Set once the peer let too much pile up; the connection is on its way out.
-    bool send_refused_ = false;
+    bool send_refused_ GUARDED_BY(send_mutex_) = false;
     // Calls received and not yet answered, and their bytes: what a flooding peer holds here.
     std::atomic<uint32_t> calls_in_flight_{0};
     std::atomic<size_t> call_bytes_in_flight_{0};
 
     std::mutex mutex_;
-    uint64_t next_transaction_id_ = 1;
+    uint64_t next_transaction_id_ GUARDED_BY(mutex_) = 1;
     // Few at a time: a flat table spares an allocation per call.
-    std::vector<std::pair<uint64_t, Waiter*>> waiters_;
-    std::unordered_map<uint64_t, Export> exports_;
-    std::unordered_map<uint64_t, ProxyBinder*> proxies_;
-    bool hello_seen_ = false;
-    bool reading_ = false;  // the reading role is taken
-    FrameBuffer buffer_;    // used by the holder of the reading role only
+    std::vector<std::pair<uint64_t, Waiter*>> waiters_ GUARDED_BY(mutex_);
+    std::unordered_map<uint64_t, Export> exports_ GUARDED_BY(mutex_);
+    std::unordered_map<uint64_t, ProxyBinder*> proxies_ GUARDED_BY(mutex_);
+    bool hello_seen_ GUARDED_BY(mutex_) = false;
+    bool reading_ GUARDED_BY(mutex_) = false;  // the reading role is taken
+    FrameBuffer buffer_;                       // used by the holder of the reading role only
 };
 
 }  // namespace vyr_binder

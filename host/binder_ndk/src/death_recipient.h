@@ -1,5 +1,6 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
 #include <android/binder_ibinder.h>
 
 #include <atomic>
@@ -36,7 +37,7 @@ class DeathRecipientState {
     std::atomic<AIBinder_DeathRecipient_onBinderUnlinked> on_unlinked_{nullptr};
     std::atomic<bool> deleted_{false};
     std::mutex mutex_;
-    std::vector<RefCounts*> binders_;  // weak references
+    std::vector<RefCounts*> binders_ GUARDED_BY(mutex_);  // weak references
 };
 
 // One link: a recipient and the cookie it was linked with.

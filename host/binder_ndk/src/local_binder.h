@@ -1,5 +1,7 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
+
 #include <atomic>
 #include <cstdint>
 #include <deque>
@@ -44,8 +46,8 @@ class LocalBinder : public AIBinder {
     void* const user_data_;
     std::atomic<uint64_t> export_id_{0};
     std::mutex oneway_mutex_;
-    bool oneway_running_ = false;
-    std::deque<std::function<void()>> oneway_queue_;
+    bool oneway_running_ GUARDED_BY(oneway_mutex_) = false;
+    std::deque<std::function<void()>> oneway_queue_ GUARDED_BY(oneway_mutex_);
 };
 
 }  // namespace vyr_binder

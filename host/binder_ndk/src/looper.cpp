@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "connection.h"
+#include "unique_lock.h"
 
 namespace vyr_binder {
 namespace {
@@ -134,7 +135,7 @@ void Looper::RunTask(std::function<void()> task) {
 
 void Looper::Run(Kind kind) {
     t_runtime_thread = true;
-    std::unique_lock<std::mutex> lock(mutex_);
+    UniqueLock lock(mutex_);
     while (!stopping_) {
         const bool executor = kind != Kind::kLooper || started_;
         if (executor && !queue_.empty()) {
@@ -221,8 +222,8 @@ std::vector<std::shared_ptr<Connection>> Looper::Connections() {
 }
 
 void Looper::WaitForNoConnections() {
-    std::unique_lock<std::mutex> lock(mutex_);
-    cv_.wait(lock, [this] { return connections_.empty(); });
+    UniqueLock lock(mutex_);
+    cv_.wait(lock.native(), [this]() REQUIRES(mutex_) { return connections_.empty(); });
 }
 
 void Looper::Shutdown() {
@@ -242,8 +243,8 @@ void Looper::Shutdown() {
     for (std::thread& thread : threads) thread.join();
     for (auto& task : tasks) task.first.join();
     dropped.clear();
-    std::unique_lock<std::mutex> lock(mutex_);
-    cv_.wait(lock, [this] { return joined_ == 0; });
+    UniqueLock lock(mutex_);
+    cv_.wait(lock.native(), [this]() REQUIRES(mutex_) { return joined_ == 0; });
     uint64_t value;
     if (read(stop_fd_, &value, sizeof(value)) < 0) value = 0;
     queue_.clear();

@@ -1,5 +1,7 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
+
 #include <condition_variable>
 #include <cstdint>
 #include <deque>
@@ -68,11 +70,13 @@ class Looper {
     enum class Kind { kLooper, kPool, kJoined };
 
     void Run(Kind kind);
-    void SpawnLocked(Kind kind);
-    void ArmWorkLocked();
-    bool HaveExecutorsLocked() const { return started_ || joined_ > 0; }
-    uint32_t ExecutorsLocked() const { return (started_ ? spawned_ : 0) + joined_; }
-    void SpawnIfAllBusyLocked();
+    void SpawnLocked(Kind kind) REQUIRES(mutex_);
+    void ArmWorkLocked() REQUIRES(mutex_);
+    bool HaveExecutorsLocked() const REQUIRES(mutex_) { return started_ || joined_ > 0; }
+    uint32_t ExecutorsLocked() const REQUIRES(mutex_) {
+        return (started_ ? spawned_ : 0) + joined_;
+    }
+    void SpawnIfAllBusyLocked() REQUIRES(mutex_);
     void Control(int op, int fd, uint32_t events, uint64_t tag);
 
     const int epoll_fd_;
@@ -81,19 +85,19 @@ class Looper {
 
     mutable std::mutex mutex_;
     std::condition_variable cv_;
-    std::deque<std::function<void()>> queue_;
-    std::vector<std::thread> threads_;
-    std::vector<std::pair<std::thread, std::shared_ptr<bool>>> tasks_;
-    std::map<uint64_t, std::shared_ptr<Connection>> connections_;
-    uint64_t next_serial_ = 1;
-    uint32_t max_threads_ = kDefaultMaxThreads;
-    uint32_t spawned_ = 0;
-    uint32_t idle_executors_ = 0;  // waiting in epoll
-    uint32_t serving_ = 0;         // running a call or queued work
-    uint32_t joined_ = 0;
-    bool looper_running_ = false;
-    bool started_ = false;
-    bool stopping_ = false;
+    std::deque<std::function<void()>> queue_ GUARDED_BY(mutex_);
+    std::vector<std::thread> threads_ GUARDED_BY(mutex_);
+    std::vector<std::pair<std::thread, std::shared_ptr<bool>>> tasks_ GUARDED_BY(mutex_);
+    std::map<uint64_t, std::shared_ptr<Connection>> connections_ GUARDED_BY(mutex_);
+    uint64_t next_serial_ GUARDED_BY(mutex_) = 1;
+    uint32_t max_threads_ GUARDED_BY(mutex_) = kDefaultMaxThreads;
+    uint32_t spawned_ GUARDED_BY(mutex_) = 0;
+    uint32_t idle_executors_ GUARDED_BY(mutex_) = 0;  // waiting in epoll
+    uint32_t serving_ GUARDED_BY(mutex_) = 0;         // running a call or queued work
+    uint32_t joined_ GUARDED_BY(mutex_) = 0;
+    bool looper_running_ GUARDED_BY(mutex_) = false;
+    bool started_ GUARDED_BY(mutex_) = false;
+    bool stopping_ GUARDED_BY(mutex_) = false;
 };
 
 }  // namespace vyr_binder

@@ -84,8 +84,8 @@ bool ProcessState::EnsureListenerLocked(const std::string& dir) {
 void ProcessState::RemoveFilesAtExit() {
     ProcessState& state = Get();
     // Another thread may hold the lock forever at exit; cleaning up is only a courtesy then.
-    std::unique_lock<std::mutex> lock(state.mutex_, std::try_to_lock);
-    if (!lock.owns_lock()) return;
+    if (!state.mutex_.try_lock()) return;
+    std::lock_guard<std::mutex> lock(state.mutex_, std::adopt_lock);
     for (const auto& entry : state.published_) {
         Registry::Unpublish(entry.first, entry.second, state.key_);
     }

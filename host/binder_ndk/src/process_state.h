@@ -1,5 +1,6 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
 #include <android/binder_auto_utils.h>
 #include <android/binder_status.h>
 
@@ -41,20 +42,22 @@ class ProcessState {
   private:
     ProcessState() = default;
     std::shared_ptr<Connection> ConnectTo(const std::string& dir, const std::string& key);
-    bool EnsureListenerLocked(const std::string& dir);
+    bool EnsureListenerLocked(const std::string& dir) REQUIRES(mutex_);
     static void RemoveFilesAtExit();
 
     Looper looper_;
 
     std::mutex services_mutex_;
-    std::map<std::string, ndk::SpAIBinder> services_;
+    std::map<std::string, ndk::SpAIBinder> services_ GUARDED_BY(services_mutex_);
 
     std::mutex mutex_;
-    std::string key_;
-    bool shutting_down_ = false;
-    std::map<std::string, std::weak_ptr<Connection>> by_key_;
-    std::map<std::string, std::unique_ptr<Listener>> listeners_;  // by registry directory
-    std::vector<std::pair<std::string, std::string>> published_;  // (directory, name)
+    std::string key_ GUARDED_BY(mutex_);
+    bool shutting_down_ GUARDED_BY(mutex_) = false;
+    std::map<std::string, std::weak_ptr<Connection>> by_key_ GUARDED_BY(mutex_);
+    // By registry directory.
+    std::map<std::string, std::unique_ptr<Listener>> listeners_ GUARDED_BY(mutex_);
+    // (directory, name)
+    std::vector<std::pair<std::string, std::string>> published_ GUARDED_BY(mutex_);
 };
 
 }  // namespace vyr_binder

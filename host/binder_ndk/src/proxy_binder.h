@@ -1,5 +1,7 @@
 #pragma once
 
+#include <android-base/thread_annotations.h>
+
 #include <cstdint>
 #include <memory>
 #include <mutex>
@@ -48,8 +50,8 @@ class ProxyBinder : public AIBinder {
     const uint64_t remote_id_;
     const std::string descriptor_;
     std::mutex mutex_;
-    bool obituaries_sent_ = false;
-    std::vector<DeathLink> links_;
+    bool obituaries_sent_ GUARDED_BY(mutex_) = false;
+    std::vector<DeathLink> links_ GUARDED_BY(mutex_);
 };
 
 }  // namespace vyr_binder
