@@ -100,7 +100,9 @@ int RangeSimulator::Process(MultiRangingData* data) {
         }
         // Another reader may have taken this frame, or the rate changed: wait for the next one.
         if (schedule_version_ != version || frame < next_frame_) continue;
-        FillFrameLocked(frame, Clock::now(), data);
+        // Stamped with when the frame was ready, not when a late reader took it: frames are
+        // exactly one period apart, as a sensor's own clock would have them.
+        FillFrameLocked(frame, FrameReadyLocked(frame), data);
         next_frame_ = frame + 1;
         return 0;
     }
@@ -132,13 +134,13 @@ void RangeSimulator::RestartScheduleLocked(Clock::time_point now, int rate_hz) {
     ++schedule_version_;
 }
 
-void RangeSimulator::FillFrameLocked(uint32_t frame, Clock::time_point now,
+void RangeSimulator::FillFrameLocked(uint32_t frame, Clock::time_point ready,
                                      MultiRangingData* data) const {
     *data = MultiRangingData{};
     const double offset_ms = FrameOffsetMsLocked(frame);
     scene_.FillZones(frame, offset_ms, scenario_.zone_count, data);
     data->time_ms = static_cast<uint32_t>(
-        std::chrono::duration_cast<std::chrono::milliseconds>(now - init_time_).count());
+        std::chrono::duration_cast<std::chrono::milliseconds>(ready - init_time_).count());
     data->stream_count = static_cast<uint8_t>(frame);
     data->device_status = 0;
     data->zone_count = static_cast<uint8_t>(scenario_.zone_count);

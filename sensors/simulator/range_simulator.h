@@ -37,7 +37,7 @@ class RangeSimulator {
     uint32_t PendingFrameLocked(Clock::time_point now) const;
     // Starts a new schedule at `now` with `rate_hz`, continuing the frame numbers and scene time.
     void RestartScheduleLocked(Clock::time_point now, int rate_hz);
-    void FillFrameLocked(uint32_t frame, Clock::time_point now, MultiRangingData* data) const;
+    void FillFrameLocked(uint32_t frame, Clock::time_point ready, MultiRangingData* data) const;
     void FillIdleLocked(Clock::time_point now, MultiRangingData* data) const;
     void PublishLocked() const;
 
