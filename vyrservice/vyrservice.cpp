@@ -178,25 +178,6 @@ WorkQueue& VYRService::QueueForMode(int32_t mode) {
     return work_queues_[mode == kRangeMode ? kRangeSensorType : kAlsSensorType];
 }
 
-VYRService::ModeBlockSnapshot VYRService::SnapshotModeBlock(size_t index) {
-    // The lock of the worker that changes the block: the range worker owns the range block.
-    std::lock_guard<std::mutex> lock(
-        sensor_locks_[index == static_cast<size_t>(range_params_index_) ? kRangeSensorType
-                                                                        : kAlsSensorType]);
-    ServiceModeParams& params = mode_params_.at(index);
-    return ModeBlockSnapshot{params.running.load(), params.mode.load(), params.enable_count,
-                             params.active_period.load(), params.periods};
-}
-
-void VYRService::PushWorkItem(const WorkItem& item) {
-    QueueForMode(item.mode).PushAndSignal(item);
-}
-
-size_t VYRService::DeathLinkCount() {
-    std::lock_guard<std::mutex> lock(links_mutex_);
-    return death_links_.size();
-}
-
 // Client table.
 
 ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {

@@ -66,24 +66,10 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // What the dump shows of the APEX update listener, which the process owns beside the service.
     void SetApexSection(std::function<DumpValue()> section);
 
-    // A consistent copy of one mode block's scheduling state, for tests and diagnostics; waits
-    // for the block's worker to finish the item it is applying.
-    struct ModeBlockSnapshot {
-        bool running;
-        int32_t mode;
-        int32_t enable_count;
-        int32_t active_period;
-        std::unordered_map<int32_t, int32_t> periods;
-    };
-    ModeBlockSnapshot SnapshotModeBlock(size_t index);
-    // Queues an item for the worker of its mode, as the binder methods and the display monitor
-    // do. Lets tests reach worker states that no client sequence produces.
-    void PushWorkItem(const WorkItem& item);
-    // Death links not yet given back: one per client with a callback, plus any whose notice is
-    // on its way.
-    size_t DeathLinkCount();
-
   private:
+    // Tests reach the scheduling state through it (tests/support).
+    friend class VYRServiceTestPeer;
+
     int32_t NewHandle() REQUIRES(api_lock_);
     ServiceModeParams& ParamsForMode(int32_t mode);
     WorkQueue& QueueForMode(int32_t mode);

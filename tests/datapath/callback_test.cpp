@@ -148,9 +148,9 @@ TEST_F(CallbackTest, PeriodBelowOneBecomesOneSecond) {
     EnableOk(zero, 0);
     EnableOk(negative, -5);
     auto deadline = steady_clock::now() + kWait;
-    VYRService::ModeBlockSnapshot snapshot{};
+    vyr_test::ModeBlockSnapshot snapshot{};
     do {
-        snapshot = service_->SnapshotModeBlock(kRangeBlock);
+        snapshot = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kRangeBlock);
         if (snapshot.enable_count < 2) std::this_thread::sleep_for(milliseconds(5));
     } while (snapshot.enable_count < 2 && steady_clock::now() < deadline);
     ASSERT_EQ(snapshot.enable_count, 2);

@@ -106,7 +106,8 @@ void InProcessServiceTest::WaitForIdleWorkers() {
     auto deadline = std::chrono::steady_clock::now() + kWait;
     for (size_t block : kModeBlocks) {
         while (true) {
-            VYRService::ModeBlockSnapshot snapshot = service_->SnapshotModeBlock(block);
+            vyr_test::ModeBlockSnapshot snapshot =
+                vyr_test::ServicePeer::SnapshotModeBlock(*service_, block);
             if (!snapshot.running && snapshot.enable_count <= 0) break;
             ASSERT_LT(std::chrono::steady_clock::now(), deadline)
                 << "mode block " << block << " still sampling";

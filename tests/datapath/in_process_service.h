@@ -17,6 +17,7 @@
 #include "recording_callback.h"
 #include "sensor_doubles.h"
 #include "vyrservice.h"
+#include "vyrservice_test_peer.h"
 
 namespace vyr_datapath {
 

@@ -96,10 +96,10 @@ TEST_F(NestedCallTest, CloseFromOnEventKeepsTheEnableCountAsCloseAlwaysDoes) {
         << "the notification thread ends; sampling goes on for the enable left in force";
     Event event{};
     EXPECT_EQ(Poll(handle_, &event), -22);
-    EXPECT_EQ(service_->SnapshotModeBlock(kRangeBlock).enable_count, 1);
+    EXPECT_EQ(vyr_test::ServicePeer::SnapshotModeBlock(*service_, kRangeBlock).enable_count, 1);
     // What Close leaves behind is withdrawn as a disable item would; the fixture expects idle
     // workers at its end.
-    service_->PushWorkItem({false, kRange, handle_, 0});
+    vyr_test::ServicePeer::PushWorkItem(*service_, {false, kRange, handle_, 0});
 }
 
 TEST_F(NestedCallTest, EnableAfterANestedDisableStartsOneNewThread) {

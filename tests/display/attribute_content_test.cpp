@@ -9,7 +9,7 @@ using AttributeContentTest = DisplayTest;
 
 constexpr char kReadError[] = "vyrservice failed to read display state file: ";
 
-bool IsCount(const VYRService::ModeBlockSnapshot& block, int32_t count) {
+bool IsCount(const vyr_test::ModeBlockSnapshot& block, int32_t count) {
     return block.enable_count == count;
 }
 
@@ -52,7 +52,7 @@ TEST_F(AttributeContentTest, ReadErrorWhileLitDisablesAsDark) {
         log_.WaitFor(kTag, ANDROID_LOG_ERROR, std::string(kReadError) + strerror(EIO), kWait));
     ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000)));
-    EXPECT_FALSE(service_->SnapshotModeBlock(kAlsBlock).running);
+    EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).running);
     // The error path logs no display-state line of its own.
     EXPECT_EQ(0u, DisableLines("On\n"));
 
@@ -91,7 +91,7 @@ TEST_F(AttributeContentTest, ContentIsJudgedAsReadWithoutANewline) {
     ASSERT_TRUE(WaitForDisableLine("hbm on ON"));
     // The worker may lag behind the monitor: wait until it has applied every item.
     ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 3));
-    EXPECT_EQ(0, service_->SnapshotModeBlock(kAlsBlock).enable_count);
+    EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).enable_count);
 }
 
 }  // namespace

@@ -71,7 +71,7 @@ void DisplayTest::TearDown() {
         } else if (panel_ != "Off") {
             Panel("Off");
         }
-        WaitForBlock(kAlsBlock, [](const VYRService::ModeBlockSnapshot& block) {
+        WaitForBlock(kAlsBlock, [](const vyr_test::ModeBlockSnapshot& block) {
             return block.enable_count <= 0 && !block.running;
         });
     }
@@ -168,8 +168,10 @@ bool DisplayTest::WaitForMonitorRead(size_t length) {
 }
 
 bool DisplayTest::WaitForBlock(
-    size_t index, const std::function<bool(const VYRService::ModeBlockSnapshot&)>& condition) {
-    return WaitUntil([&] { return condition(service_->SnapshotModeBlock(index)); }, kWait);
+    size_t index, const std::function<bool(const vyr_test::ModeBlockSnapshot&)>& condition) {
+    return WaitUntil(
+        [&] { return condition(vyr_test::ServicePeer::SnapshotModeBlock(*service_, index)); },
+        kWait);
 }
 
 std::future<void> DisplayTest::StartDestruction() {
@@ -216,7 +218,7 @@ std::string DisplayTest::DisableWorkText(int32_t count, int32_t handle, int32_t 
 }
 
 int32_t DisplayTest::DisplayHandle() {
-    const auto block = service_->SnapshotModeBlock(kAlsBlock);
+    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(1u, block.periods.size());
     return block.periods.empty() ? 0 : block.periods.begin()->first;
 }

@@ -16,6 +16,7 @@
 #include "sensor_doubles.h"
 #include "thread_count.h"
 #include "vyrservice.h"
+#include "vyrservice_test_peer.h"
 #include "work_log.h"
 
 namespace vyr_display_test {
@@ -71,7 +72,7 @@ class DisplayTest : public ::testing::Test {
     static bool WaitForMonitorRead(size_t length);
     // Waits until the light or range block satisfies `condition`.
     bool WaitForBlock(size_t index,
-                      const std::function<bool(const VYRService::ModeBlockSnapshot&)>& condition);
+                      const std::function<bool(const vyr_test::ModeBlockSnapshot&)>& condition);
     // Starts destroying the service on another thread.
     std::future<void> StartDestruction();
     // Notifies the display monitor's attribute again every 20 ms (waking the monitor without

@@ -13,9 +13,8 @@ using sensor_doubles::WaitForCalls;
 
 using DisplayStateTest = DisplayTest;
 
-std::function<bool(const VYRService::ModeBlockSnapshot&)> EnableCountIs(int32_t count) {
-    return
-        [count](const VYRService::ModeBlockSnapshot& block) { return block.enable_count == count; };
+std::function<bool(const vyr_test::ModeBlockSnapshot&)> EnableCountIs(int32_t count) {
+    return [count](const vyr_test::ModeBlockSnapshot& block) { return block.enable_count == count; };
 }
 
 TEST_F(DisplayStateTest, OnWithNewlineEnablesTheLightModeForTheDisplay) {
@@ -26,7 +25,7 @@ TEST_F(DisplayStateTest, OnWithNewlineEnablesTheLightModeForTheDisplay) {
     ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
     const int32_t display = DisplayHandle();
     EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, EnableWorkText(1, display, 1000, 1000), kWait));
-    const auto block = service_->SnapshotModeBlock(kAlsBlock);
+    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_TRUE(block.running);
     EXPECT_EQ(1, block.mode);
     EXPECT_EQ(1000, block.active_period);
@@ -40,7 +39,7 @@ TEST_F(DisplayStateTest, OnWithNewlineEnablesTheLightModeForTheDisplay) {
     ASSERT_TRUE(WaitForDisableLine("Off\n"));
     ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
     EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000), kWait));
-    EXPECT_FALSE(service_->SnapshotModeBlock(kAlsBlock).running);
+    EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).running);
 }
 
 TEST_F(DisplayStateTest, DumpShowsTheLastPanelStateAndItsChanges) {
@@ -96,7 +95,7 @@ TEST_F(DisplayStateTest, OffLowerCaseOnAndEmptyAreDark) {
     ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 3));
     EXPECT_EQ(3u, WorkLines("EnableWork", display));
     EXPECT_EQ(3u, EnableLines("On\n"));
-    const auto block = service_->SnapshotModeBlock(kAlsBlock);
+    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(0, block.enable_count);
     EXPECT_FALSE(block.running);
 }
@@ -122,7 +121,7 @@ TEST_F(DisplayStateTest, RepeatedLitNotificationsQueueOneEnable) {
     EXPECT_EQ(0u, EnableLines("On On\n"));
     EXPECT_EQ(1u, WorkLines("EnableWork", display));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000)));
-    EXPECT_EQ(0, service_->SnapshotModeBlock(kAlsBlock).enable_count);
+    EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).enable_count);
 }
 
 TEST_F(DisplayStateTest, RepeatedDarkNotificationsQueueNothing) {
@@ -166,7 +165,7 @@ TEST_F(DisplayStateTest, OnlyTheFirstFortyNineBytesAreJudged) {
     Panel("Off");
     ASSERT_TRUE(WaitForDisableLine("Off\n"));
     ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 3));
-    EXPECT_EQ(0, service_->SnapshotModeBlock(kAlsBlock).enable_count);
+    EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).enable_count);
 }
 
 TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
@@ -186,7 +185,7 @@ TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
     ASSERT_EQ(0, result);
     ASSERT_TRUE(WaitForWorkLines("EnableWork", client, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableWorkText(2, client, 200, 200)));
-    auto block = service_->SnapshotModeBlock(kAlsBlock);
+    auto block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(2, block.enable_count);
     EXPECT_EQ(200, block.active_period);
     EXPECT_EQ((std::unordered_map<int32_t, int32_t>{{display, 1000}, {client, 200}}), block.periods);
@@ -194,7 +193,7 @@ TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
     ASSERT_TRUE(service_->Disable(client).isOk());
     ASSERT_TRUE(WaitForWorkLines("DisableWork", client, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(1, client, 1000)));
-    block = service_->SnapshotModeBlock(kAlsBlock);
+    block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(1, block.enable_count);
     EXPECT_EQ(1000, block.active_period);
     EXPECT_TRUE(block.running);
@@ -205,7 +204,7 @@ TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
     ASSERT_TRUE(WaitForDisableLine("Off\n"));
     ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000)));
-    block = service_->SnapshotModeBlock(kAlsBlock);
+    block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(0, block.enable_count);
     EXPECT_FALSE(block.running);
     // The worker joined the processing thread before it logged: no read starts any more, which a

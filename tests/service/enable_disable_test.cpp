@@ -50,7 +50,7 @@ TEST_F(EnableDisableTest, PeriodBelowOneBecomesOneSecond) {
         const int32_t handle = OpenAndEnable(1, period);
         EXPECT_TRUE(
             log_.Contains(kTag, ANDROID_LOG_INFO, EnableWorkLog(1, 1, handle, 1000, 1000, 0)));
-        EXPECT_EQ(1000, impl_->SnapshotModeBlock(0).active_period);
+        EXPECT_EQ(1000, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).active_period);
         DisableAndWait(handle);
         ASSERT_TRUE(service_->Close(handle).isOk());
     }

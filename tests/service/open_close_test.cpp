@@ -120,7 +120,7 @@ TEST_F(OpenCloseTest, CloseOfEnabledClientEndsNotificationButKeepsEnableCount) {
     EXPECT_EQ(idle_threads, ThreadCount());
     EXPECT_EQ(1, callback.use_count());
 
-    const auto block = impl_->SnapshotModeBlock(2);
+    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2);
     EXPECT_EQ(1, block.enable_count);
     EXPECT_TRUE(block.running);
     EXPECT_EQ(1u, block.periods.count(handle));
@@ -137,7 +137,7 @@ TEST_F(OpenCloseTest, EmptyCallbackIsRefused) {
     // Still a polling client: enabling starts the processing thread and no notification thread.
     ASSERT_EQ(0, Enable(handle, 100));
     ASSERT_TRUE(WaitForWorkLog("EnableWork", handle));
-    impl_->SnapshotModeBlock(BlockOf(3));
+    vyr_test::ServicePeer::SnapshotModeBlock(*impl_, BlockOf(3));
     EXPECT_EQ(baseline_threads_ + 2, ThreadCount());
     DisableAndWait(handle);
 }
@@ -203,17 +203,17 @@ TEST_F(OpenCloseTest, NoModeSelectsTheMiddleBlock) {
     MakeService();
     const int32_t als = OpenAndEnable(1, 100);
     const int32_t range = OpenAndEnable(3, 200);
-    const auto middle = impl_->SnapshotModeBlock(1);
+    const auto middle = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 1);
     EXPECT_FALSE(middle.running);
     EXPECT_EQ(0, middle.mode);
     EXPECT_EQ(0, middle.enable_count);
     EXPECT_EQ(1000, middle.active_period);
     EXPECT_TRUE(middle.periods.empty());
-    EXPECT_EQ(1, impl_->SnapshotModeBlock(0).mode);
-    EXPECT_EQ(3, impl_->SnapshotModeBlock(2).mode);
+    EXPECT_EQ(1, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).mode);
+    EXPECT_EQ(3, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).mode);
     DisableAndWait(als);
     DisableAndWait(range);
-    EXPECT_EQ(0, impl_->SnapshotModeBlock(1).enable_count);
+    EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 1).enable_count);
 }
 
 }  // namespace

@@ -69,7 +69,7 @@ int32_t ServiceTest::OpenAndEnable(int32_t mode, int32_t period) {
     const size_t before = WorkLogCount("EnableWork", handle);
     EXPECT_EQ(0, Enable(handle, period));
     EXPECT_TRUE(WaitForWorkLog("EnableWork", handle, before + 1));
-    impl_->SnapshotModeBlock(BlockOf(mode));
+    vyr_test::ServicePeer::SnapshotModeBlock(*impl_, BlockOf(mode));
     return handle;
 }
 
@@ -78,7 +78,7 @@ void ServiceTest::DisableAndWait(int32_t handle) {
     EXPECT_TRUE(service_->Disable(handle).isOk());
     EXPECT_TRUE(WaitForWorkLog("DisableWork", handle, before + 1));
     // The worker logs before its last library call; the snapshot waits for the whole item.
-    impl_->SnapshotModeBlock(BlockOf(modes_[handle]));
+    vyr_test::ServicePeer::SnapshotModeBlock(*impl_, BlockOf(modes_[handle]));
 }
 
 size_t ServiceTest::WorkLogCount(const std::string& work, int32_t handle) {

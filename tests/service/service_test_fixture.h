@@ -15,6 +15,7 @@
 #include "sensor_doubles.h"
 #include "thread_count.h"
 #include "vyrservice.h"
+#include "vyrservice_test_peer.h"
 #include "work_log.h"
 
 namespace vyr_service_test {

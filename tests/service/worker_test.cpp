@@ -55,7 +55,7 @@ TEST_F(WorkerTest, ActivePeriodIsTheSmallestAndRecomputedOnDisable) {
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableLog(3, 2, second, 100, 100, 1)));
     DisableAndWait(second);
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(3, 1, second, 200, 1)));
-    EXPECT_EQ(200, impl_->SnapshotModeBlock(2).active_period);
+    EXPECT_EQ(200, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).active_period);
     DisableAndWait(first);
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(3, 0, first, 200, 1)));
 }
@@ -68,23 +68,23 @@ TEST_F(WorkerTest, RecomputedActivePeriodIsCappedAtFiveSeconds) {
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableLog(1, 2, second, 9000, 8000, 0)));
     DisableAndWait(first);
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(1, 1, first, 5000, 0)));
-    const auto block = impl_->SnapshotModeBlock(0);
+    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0);
     EXPECT_EQ(5000, block.active_period);
     EXPECT_TRUE(block.running);
     DisableAndWait(second);
     // The last period stays after sampling stops.
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(1, 0, second, 5000, 0)));
-    EXPECT_FALSE(impl_->SnapshotModeBlock(0).running);
+    EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).running);
 }
 
 TEST_F(WorkerTest, DisableWithoutEnableMakesTheCountNegative) {
     MakeService();
-    impl_->PushWorkItem(WorkItem{false, 3, 77, 0});
+    vyr_test::ServicePeer::PushWorkItem(*impl_, WorkItem{false, 3, 77, 0});
     ASSERT_TRUE(WaitForWorkLog("DisableWork", 77));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_WARN,
                               "DisableWork: mode 3 enable count becomes negative (-1)"));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(3, -1, 77, 1000, 1)));
-    const auto block = impl_->SnapshotModeBlock(2);
+    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2);
     EXPECT_EQ(-1, block.enable_count);
     EXPECT_FALSE(block.running);
     EXPECT_EQ((std::vector<std::string>{"RangeSensor::Enable(0)", "RangeSensor::Uninit()"}),
@@ -121,12 +121,12 @@ TEST_F(WorkerTest, FailedInitStartsNoProcessingThread) {
     const size_t threads = ThreadCount();
     const int32_t handle = OpenAndEnable(3, 50);
     // The snapshot waits for the worker to finish the item.
-    EXPECT_TRUE(impl_->SnapshotModeBlock(2).running);
+    EXPECT_TRUE(vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).running);
     EXPECT_EQ(threads, ThreadCount());
     EXPECT_EQ(1u, CountOf(kRangeEnable));
     DisableAndWait(handle);
     EXPECT_EQ(0u, CountOf(kRangeProcess));
-    EXPECT_FALSE(impl_->SnapshotModeBlock(2).running);
+    EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).running);
 }
 
 TEST_F(WorkerTest, AmbientLightFlagFollowsTheFirstEnableAndTheLastDisable) {

@@ -1,0 +1,29 @@
+#include "vyrservice_test_peer.h"
+
+#include <mutex>
+
+#include "sensor_modes.h"
+
+namespace android {
+namespace vyr {
+namespace binder {
+
+VYRServiceTestPeer::ModeBlockSnapshot VYRServiceTestPeer::SnapshotModeBlock(VYRService& service,
+                                                                            size_t index) {
+    // The lock of the worker that changes the block: the range worker owns the range block.
+    std::lock_guard<std::mutex> lock(
+        service.sensor_locks_[index == static_cast<size_t>(service.range_params_index_)
+                                  ? kRangeSensorType
+                                  : kAlsSensorType]);
+    ServiceModeParams& params = service.mode_params_.at(index);
+    return ModeBlockSnapshot{params.running.load(), params.mode.load(), params.enable_count,
+                             params.active_period.load(), params.periods};
+}
+
+void VYRServiceTestPeer::PushWorkItem(VYRService& service, const WorkItem& item) {
+    service.QueueForMode(item.mode).PushAndSignal(item);
+}
+
+}  // namespace binder
+}  // namespace vyr
+}  // namespace android

@@ -1,0 +1,41 @@
+#pragma once
+
+// What tests may reach inside a VYRService that no binder method shows: a consistent copy of a
+// mode block's scheduling state, and a way to queue work items that no client sequence makes.
+
+#include <cstddef>
+#include <cstdint>
+#include <unordered_map>
+
+#include "vyrservice.h"
+#include "work_queue.h"
+
+namespace android {
+namespace vyr {
+namespace binder {
+
+class VYRServiceTestPeer {
+  public:
+    struct ModeBlockSnapshot {
+        bool running;
+        int32_t mode;
+        int32_t enable_count;
+        int32_t active_period;
+        std::unordered_map<int32_t, int32_t> periods;
+    };
+
+    // Waits for the block's worker to finish the item it is applying.
+    static ModeBlockSnapshot SnapshotModeBlock(VYRService& service, size_t index);
+    // Queues an item for the worker of its mode, as the binder methods and the display monitor
+    // do.
+    static void PushWorkItem(VYRService& service, const WorkItem& item);
+};
+
+}  // namespace binder
+}  // namespace vyr
+}  // namespace android
+
+namespace vyr_test {
+using ServicePeer = android::vyr::binder::VYRServiceTestPeer;
+using ModeBlockSnapshot = android::vyr::binder::VYRServiceTestPeer::ModeBlockSnapshot;
+}  // namespace vyr_test
