@@ -92,8 +92,9 @@ class ApexUpdateListener {
     int32_t watch_descriptor_;
     // Written only by the listener thread, which alone also reads it without the lock.
     std::set<Info> current_info_;
-    std::thread thread_;
     mutable std::mutex status_mutex_;
     uint64_t reloads_ GUARDED_BY(status_mutex_) = 0;
     std::function<void(const std::string&)> reload_observer_ GUARDED_BY(status_mutex_);
+    // Last: the thread starts in the constructor and uses every member above.
+    std::thread thread_;
 };
