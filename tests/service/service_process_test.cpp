@@ -317,7 +317,6 @@ TEST_F(ServiceProcessTest, RegistrationFailureLeavesAnUnreachableRunningProcess)
     EXPECT_TRUE(binder.get() == nullptr || !AIBinder_isAlive(binder.get()));
 }
 
-#ifdef VYRCTL_BINARY
 TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
     auto process = StartService();
     ASSERT_NE(nullptr, WaitForRegistration(30s).get()) << "vyrservice never registered";
@@ -371,7 +370,6 @@ TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
     EXPECT_EQ(std::optional<int>(0), shell.Wait(10s));
     EXPECT_TRUE(process->Running());
 }
-#endif
 
 // Child role: a client that enables range events with a callback set twice, reports its handle
 // on stdout and waits to be killed.
