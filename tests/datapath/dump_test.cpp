@@ -148,7 +148,8 @@ TEST_F(DumpTest, CountsSamplesInvalidSamplesRefusedPollsAndDeliveries) {
         dump = Json();
     }
     const json& block = dump["modes"][kRangeBlock];
-    EXPECT_EQ(block["samples"], published);
+    // At least: a read may slip through between a release and the next hold.
+    EXPECT_GE(block["samples"].get<int>(), published);
     EXPECT_EQ(block["invalid_samples"], 1);
     EXPECT_TRUE(block["last_sample_age_ms"].is_number());
     EXPECT_EQ(ClientOf(dump, poller)["polls_refused"], 2);
