@@ -150,7 +150,8 @@ TEST_F(DumpTest, CountsSamplesInvalidSamplesRefusedPollsAndDeliveries) {
     const json& block = dump["modes"][kRangeBlock];
     // At least: a read may slip through between a release and the next hold.
     EXPECT_GE(block["samples"].get<int>(), published);
-    EXPECT_EQ(block["invalid_samples"], 1);
+    EXPECT_GE(block["invalid_samples"].get<int>(), 1);
+    EXPECT_LT(block["invalid_samples"].get<int>(), block["samples"].get<int>());
     EXPECT_TRUE(block["last_sample_age_ms"].is_number());
     EXPECT_EQ(ClientOf(dump, poller)["polls_refused"], 2);
     EXPECT_EQ(ClientOf(dump, pushed)["callback"], true);
