@@ -1,6 +1,8 @@
+#define LOG_TAG "apex_update_listener"
+
 #include "apex_update_listener.h"
 
-#include <android/log.h>
+#include <log/log.h>
 #include <sys/inotify.h>
 #include <tinyxml2.h>
 #include <unistd.h>
@@ -13,8 +15,6 @@
 #include <utility>
 
 namespace {
-
-constexpr char kLogTag[] = "apex_update_listener";
 
 constexpr uint32_t kWatchMask = IN_MODIFY | IN_CREATE | IN_DELETE;
 constexpr size_t kEventBufferSize = 256;
@@ -73,28 +73,24 @@ std::unique_ptr<ApexUpdateListener> ApexUpdateListener::Make(const std::string& 
     int inotify_fd = inotify_init();
     if (inotify_fd < 0) {
         int error = errno;
-        __android_log_print(ANDROID_LOG_ERROR, kLogTag, "Failed to inotify_init(): %s (%d)",
-                            strerror(error), error);
+        ALOGE("Failed to inotify_init(): %s (%d)", strerror(error), error);
         return nullptr;
     }
     int watch_descriptor = inotify_add_watch(inotify_fd, path.c_str(), kWatchMask);
     if (watch_descriptor < 0) {
         int error = errno;
-        __android_log_print(ANDROID_LOG_ERROR, kLogTag, "Failed to inotify_add_watch(%s): %s (%d)",
-                            path.c_str(), strerror(error), error);
+        ALOGE("Failed to inotify_add_watch(%s): %s (%d)", path.c_str(), strerror(error), error);
         close(inotify_fd);
         return nullptr;
     }
     // The instance and its watch stay open on the two failures below.
     if (!callback) {
-        __android_log_print(ANDROID_LOG_ERROR, kLogTag, "Called with null callback");
+        ALOGE("Called with null callback");
         return nullptr;
     }
     std::optional<std::set<Info>> initial_info = TrySlurpInfo(package, path);
     if (!initial_info) {
-        __android_log_print(ANDROID_LOG_ERROR, kLogTag,
-                            "Could not slurp info from %s for package %s", path.c_str(),
-                            package.c_str());
+        ALOGE("Could not slurp info from %s for package %s", path.c_str(), package.c_str());
         return nullptr;
     }
     if (invoke_with_initial_version) {
@@ -109,12 +105,12 @@ std::optional<std::set<ApexUpdateListener::Info>> ApexUpdateListener::TrySlurpIn
     tinyxml2::XMLDocument document;
     tinyxml2::XMLError result = document.LoadFile(path.c_str());
     if (result != tinyxml2::XML_SUCCESS) {
-        __android_log_print(ANDROID_LOG_ERROR, kLogTag, "XML parsing failed: %d", result);
+        ALOGE("XML parsing failed: %d", result);
         return std::nullopt;
     }
     const tinyxml2::XMLElement* list = document.FirstChildElement("apex-info-list");
     if (list == nullptr) {
-        __android_log_print(ANDROID_LOG_ERROR, kLogTag, "XML did not contain apex-info-list");
+        ALOGE("XML did not contain apex-info-list");
         return std::nullopt;
     }
 
@@ -148,8 +144,7 @@ std::optional<std::set<ApexUpdateListener::Info>> ApexUpdateListener::TrySlurpIn
         infos.insert(std::move(info));
     }
     if (infos.empty()) {
-        __android_log_print(ANDROID_LOG_ERROR, kLogTag,
-                            "XML did not contain any apex-info about %s", package.c_str());
+        ALOGE("XML did not contain any apex-info about %s", package.c_str());
         return std::nullopt;
     }
     return infos;
@@ -171,9 +166,8 @@ void ApexUpdateListener::ThreadFunction() {
         if (length < 0 || !running_) {
             if (running_) {
                 int error = errno;
-                __android_log_print(ANDROID_LOG_ERROR, kLogTag,
-                                    "Error reading inotify event from '%s': %s (%d)",
-                                    info_list_path_.c_str(), strerror(error), error);
+                ALOGE("Error reading inotify event from '%s': %s (%d)", info_list_path_.c_str(),
+                      strerror(error), error);
             }
             return;
         }
@@ -192,18 +186,15 @@ void ApexUpdateListener::ThreadFunction() {
 void ApexUpdateListener::HandleEvent(uint32_t mask) {
     const char* kind = (mask & IN_ISDIR) != 0 ? "directory" : "file";
     if ((mask & IN_CREATE) != 0) {
-        __android_log_print(ANDROID_LOG_INFO, kLogTag, "%s created as %s", info_list_path_.c_str(),
-                            kind);
+        ALOGI("%s created as %s", info_list_path_.c_str(), kind);
         if ((mask & IN_DELETE) != 0) {
             return;
         }
     } else if ((mask & IN_DELETE) != 0) {
-        __android_log_print(ANDROID_LOG_INFO, kLogTag, "%s deleted as %s", info_list_path_.c_str(),
-                            kind);
+        ALOGI("%s deleted as %s", info_list_path_.c_str(), kind);
         return;
     } else if ((mask & IN_MODIFY) != 0) {
-        __android_log_print(ANDROID_LOG_INFO, kLogTag, "%s modified as %s", info_list_path_.c_str(),
-                            kind);
+        ALOGI("%s modified as %s", info_list_path_.c_str(), kind);
     }
     // Creation, modification and any other event (IN_IGNORED, a queue overflow) may hide a change.
     CheckForUpdate();

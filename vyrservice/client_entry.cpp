@@ -10,7 +10,7 @@ ClientEntry::~ClientEntry() {
 }
 
 void ClientEntry::Disable() {
-    state = 0;
+    state = kClientDisabled;
     if (notify_cv) {
         // Taking the mutex once orders the state change before any wait that has not yet begun,
         // so the notification cannot fall between the thread's test of `state` and its wait.

@@ -22,6 +22,10 @@ class VYRService;
 // Identifies the callback binder and the service to the death notification.
 using DeathCookie = std::pair<AIBinder*, VYRService*>;
 
+// A client's `state`.
+constexpr int32_t kClientDisabled = 0;
+constexpr int32_t kClientEnabled = 1;
+
 // One open client of the service.
 struct ClientEntry {
     explicit ClientEntry(int32_t client_mode) : mode(client_mode) {}
@@ -37,8 +41,8 @@ struct ClientEntry {
     const int32_t mode;
     int32_t period = 0;
     std::shared_ptr<aidl::android::vyr::IEventCallback> callback;
-    // 1 = enabled, 0 = disabled; the notification thread polls it without a lock.
-    std::atomic<int32_t> state{0};
+    // kClientEnabled or kClientDisabled; the notification thread polls it without a lock.
+    std::atomic<int32_t> state{kClientDisabled};
     std::unique_ptr<std::thread> notify_thread;
     // Raised by each Enable; a notification thread runs only while it matches the value it was
     // started with, so one let go by a nested Disable ends although a nested Enable followed.

@@ -1,4 +1,6 @@
-#include <android/log.h>
+#define LOG_TAG "vyrservice_main"
+
+#include <log/log.h>
 
 #include <cstdlib>
 #include <memory>
@@ -11,7 +13,6 @@
 
 namespace {
 
-constexpr char kTag[] = "vyrservice_main";
 constexpr char kCameraHalApex[] = "com.tarven.nomil.camera.hal";
 constexpr char kApexInfoList[] = "/apex/apex-info-list.xml";
 
@@ -22,11 +23,11 @@ int main() {
         kCameraHalApex,
         [](const std::set<ApexUpdateListener::Info>&, const std::set<ApexUpdateListener::Info>&) {
             // A clean exit: whatever supervises the service starts it against the new HAL.
-            __android_log_print(ANDROID_LOG_INFO, kTag, "APEX version updated. Restarting.");
+            ALOGI("APEX version updated. Restarting.");
             exit(0);
         },
         false, kApexInfoList);
-    __android_log_print(ANDROID_LOG_INFO, kTag, "Using ApexUpdateListener: %p", listener.get());
+    ALOGI("Using ApexUpdateListener: %p", listener.get());
 
     android::vyr::binder::CreateAndRegisterService(
         [watched = listener.get()](android::vyr::binder::VYRService& service) {

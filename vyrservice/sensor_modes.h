@@ -13,6 +13,12 @@ constexpr int32_t kRangeMode = 3;
 constexpr unsigned int kAlsSensorType = 0;
 constexpr unsigned int kRangeSensorType = 1;
 
+// The arguments every sample is read with; their meaning is the sensor libraries' (a blocking
+// read and a 30 ms integration for the light sensor, the multi-zone mode for the range sensor).
+constexpr bool kAlsReadWait = true;
+constexpr unsigned char kAlsIntegrationMs = 30;
+constexpr int kRangeProcessMode = 3;
+
 }  // namespace binder
 }  // namespace vyr
 }  // namespace android

@@ -6,8 +6,8 @@
 #include <android-base/unique_fd.h>
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
-#include <android/log.h>
 #include <fcntl.h>
+#include <log/log.h>
 #include <poll.h>
 #include <unistd.h>
 
@@ -29,7 +29,6 @@ using aidl::android::vyr::IEventCallback;
 
 namespace {
 
-constexpr char kTag[] = "vyrservice";
 constexpr char kAlsProperty[] = "persist.vendor.camera.vyr_supported";
 constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_supported";
 constexpr char kServiceName[] = "vyrservice";
@@ -42,12 +41,6 @@ constexpr int32_t kDisplayPeriodMs = 1000;
 constexpr int32_t kLowPowerWakeMarginMs = 90;
 constexpr size_t kControlSettingsCount = 11;
 constexpr size_t kDisplayStateBufferSize = 50;
-
-#define ALOG(priority, ...) __android_log_print(priority, kTag, __VA_ARGS__)
-#define ALOGD(...) ALOG(ANDROID_LOG_DEBUG, __VA_ARGS__)
-#define ALOGI(...) ALOG(ANDROID_LOG_INFO, __VA_ARGS__)
-#define ALOGW(...) ALOG(ANDROID_LOG_WARN, __VA_ARGS__)
-#define ALOGE(...) ALOG(ANDROID_LOG_ERROR, __VA_ARGS__)
 
 // A call that waits this long for another one ends the service: something is stuck for good.
 #define LOCK_API()                                         \
@@ -252,13 +245,13 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
         return Ok();
     }
     ClientEntry& entry = *it->second;
-    if (entry.state == 1) {
+    if (entry.state == kClientEnabled) {
         *result = -EEXIST;
         return Ok();
     }
     ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
     const int32_t effective_period = period >= 1 ? period : kDefaultPeriodMs;
-    entry.state = 1;
+    entry.state = kClientEnabled;
     entry.period = effective_period;
     entry.notify_cv = std::make_unique<std::condition_variable>();
     entry.notify_mutex = std::make_unique<std::mutex>();
@@ -276,18 +269,18 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
 
 ndk::ScopedAStatus VYRService::Disable(int32_t handle) {
     LOCK_API();
-    DisableInternal(handle, false);
+    DisableInternal(handle, /*client_died=*/false);
     return Ok();
 }
 
-void VYRService::DisableInternal(int32_t handle, bool) {
+void VYRService::DisableInternal(int32_t handle, bool /*client_died*/) {
     auto it = clients_.find(handle);
     if (it == clients_.end()) {
         ALOGW("%s invalid handle %d", __func__, handle);
         return;
     }
     ClientEntry& entry = *it->second;
-    if (entry.state == 0) {
+    if (entry.state == kClientDisabled) {
         ALOGD("%s already in disable state %d", __func__, handle);
         return;
     }
@@ -328,7 +321,7 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
         return Ok();
     }
     ClientEntry& entry = *it->second;
-    if (entry.state == 1) {
+    if (entry.state == kClientEnabled) {
         // The notification thread reads the callback without a lock.
         ALOGE("%s failed. callback can only be set at DISABLE state", __func__);
         *result = -1;
@@ -425,7 +418,7 @@ void VYRService::HandleBinderDied(AIBinder* binder) {
     ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry.mode);
     RecordEvent("death of handle " + std::to_string(handle) + " (callback)");
     AIBinder_unlinkToDeath(entry.callback_binder.get(), entry.death_recipient, nullptr);
-    DisableInternal(handle, true);
+    DisableInternal(handle, /*client_died=*/true);
     CloseInternal(handle);
 }
 
@@ -445,7 +438,7 @@ void VYRService::HandleClientProcessExit(pid_t pid) {
               clients_[handle]->mode);
         RecordEvent("death of handle " + std::to_string(handle) + " (process " +
                     std::to_string(pid) + ")");
-        DisableInternal(handle, true);
+        DisableInternal(handle, /*client_died=*/true);
         CloseInternal(handle);
     }
 }
@@ -614,9 +607,9 @@ void VYRService::ProcessLoop(ServiceModeParams* params) {
         const int32_t period = params->active_period;
         if (mode == kAlsMode || mode == kRangeMode) {
             if (mode == kAlsMode) {
-                als_sensor_->ReadSingleShot(&reading, true, 30);
+                als_sensor_->ReadSingleShot(&reading, kAlsReadWait, kAlsIntegrationMs);
             } else {
-                range_sensor_->Process(3, &data);
+                range_sensor_->Process(kRangeProcessMode, &data);
             }
             // A reading taken across a disable is stale for whoever enables next.
             if (!params->running) {
@@ -733,15 +726,11 @@ void VYRService::MonitorDisplayStatus(const std::string& path) {
 
 bool VYRService::PollInternal(int32_t handle, int32_t mode, Event* event) {
     Event local{};
-    ServiceModeParams* params;
-    if (mode == kRangeMode) {
-        params = &mode_params_[range_params_index_];
-    } else if (mode == kAlsMode) {
-        params = &mode_params_[als_params_index_];
-    } else {
+    if (mode != kRangeMode && mode != kAlsMode) {
         ALOGE("%s, invalid mode", __func__);
         return false;
     }
+    ServiceModeParams* params = &ParamsForMode(mode);
     {
         std::lock_guard<std::mutex> lock(params->data_mutex);
         if (params->polled_handles.count(handle) != 0) {
@@ -802,7 +791,7 @@ void VYRService::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
     }
     // False once the client was disabled, also when a nested Enable has started a successor.
     const auto enabled = [&entry, generation] {
-        return entry->state == 1 && entry->notify_generation == generation;
+        return entry->state == kClientEnabled && entry->notify_generation == generation;
     };
     Event event{};
     while (enabled() && entry->callback) {

@@ -75,7 +75,9 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     WorkQueue& QueueForMode(int32_t mode);
 
     void CloseInternal(int32_t handle) REQUIRES(api_lock_);
-    void DisableInternal(int32_t handle, bool) REQUIRES(api_lock_);
+    // The one disable path, of Disable and of a client's death; `client_died` tells which, and
+    // changes nothing: both release the client alike.
+    void DisableInternal(int32_t handle, bool client_died) REQUIRES(api_lock_);
     void HandleBinderDied(AIBinder* binder) EXCLUDES(api_lock_);
     static void OnBinderDied(void* cookie);
     static void OnDeathLinkUnlinked(void* cookie);

@@ -148,7 +148,7 @@ DumpValue VYRService::DumpClientsLocked() const {
         DumpValue& client = clients.Append(DumpValue::Object());
         client.Set("handle", handle);
         client.Set("mode", entry->mode);
-        client.Set("state", entry->state == 1 ? "enabled" : "disabled");
+        client.Set("state", entry->state == kClientEnabled ? "enabled" : "disabled");
         client.Set("period_ms", entry->period);
         client.Set("callback", entry->callback != nullptr);
         client.Set("pid", entry->opener_pid > 0 ? DumpValue(entry->opener_pid) : DumpValue());
