@@ -11,16 +11,14 @@
 
 #include "child_process.h"
 #include "temp_dir.h"
+#include "test_files.h"
 
 namespace {
 
 namespace fs = std::filesystem;
 
 std::string ReadFile(const fs::path& path) {
-    std::ifstream file(path);
-    std::stringstream text;
-    text << file.rdbuf();
-    return text.str();
+    return vyr_test::ReadFile(path.string());
 }
 
 void WriteFile(const fs::path& path, const std::string& text) {

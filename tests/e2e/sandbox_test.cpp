@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "child_process.h"
+#include "test_files.h"
 
 namespace vyr_e2e {
 namespace {
@@ -21,10 +22,7 @@ using namespace std::chrono_literals;
 constexpr auto kWait = 10s;
 constexpr char kSetpriv[] = "/usr/bin/setpriv";
 
-std::string ReadFile(const std::string& path) {
-    std::ifstream in(path);
-    return std::string(std::istreambuf_iterator<char>(in), {});
-}
+using vyr_test::ReadFile;
 
 // vyr-sandbox running a shell command, with its stderr (and the command's output) in a file.
 class SandboxTest : public ::testing::Test {
@@ -35,11 +33,10 @@ class SandboxTest : public ::testing::Test {
             if (ci != nullptr && std::string(ci) == "true") GTEST_FAIL() << "needs root";
             GTEST_SKIP() << "needs root to create namespaces";
         }
-        char dir[] = "/tmp/vyr-sandbox-test.XXXXXX";
-        ASSERT_NE(nullptr, mkdtemp(dir));
-        dir_ = dir;
+        dir_ = vyr_test::MakeTempDir("vyr-sandbox-test.");
+        ASSERT_FALSE(dir_.empty());
         // Readable for the unprivileged run too.
-        chmod(dir, 0755);
+        chmod(dir_.c_str(), 0755);
         std::ofstream(dir_ + "/apex-info-list.xml") << "<apex-info-list/>\n";
         std::ofstream(dir_ + "/build.prop") << "persist.vendor.camera.vyr_supported=true\n";
     }

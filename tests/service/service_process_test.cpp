@@ -26,8 +26,7 @@
 #include <vector>
 
 #include "child_process.h"
-
-extern char** environ;
+#include "test_files.h"
 
 namespace {
 
@@ -35,6 +34,9 @@ using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 using aidl::android::vyr::IVYRService;
 using namespace std::chrono_literals;
+using vyr_test::ChildProcess;
+using vyr_test::MakeTempDir;
+using vyr_test::ReadFile;
 
 constexpr char kServiceName[] = "vyrservice";
 constexpr char kCallbackClientFlag[] = "--callback-client";
@@ -42,112 +44,12 @@ constexpr char kCallbackClientFlag[] = "--callback-client";
 std::string g_self;
 std::string g_work_dir;
 
-std::string MakeTempDir() {
-    char dir[] = "/tmp/vyr-service-process-XXXXXX";
-    return mkdtemp(dir);
-}
-
-std::string ReadFile(const std::string& path) {
-    std::ifstream in(path);
-    std::stringstream text;
-    text << in.rdbuf();
-    return text.str();
-}
-
-// A child process, killed (SIGTERM, then SIGKILL) and reaped when the object goes.
-class Child {
-  public:
-    Child(const std::vector<std::string>& argv, const std::vector<std::string>& extra_env,
-          const std::string& output_path, int stdout_fd = -1, int stdin_fd = -1) {
-        std::vector<std::string> env_text(extra_env);
-        for (char** e = environ; *e != nullptr; ++e) {
-            const std::string entry(*e);
-            const std::string key = entry.substr(0, entry.find('='));
-            bool overridden = false;
-            for (const auto& extra : extra_env) {
-                if (extra.compare(0, key.size() + 1, key + "=") == 0) overridden = true;
-            }
-            if (!overridden) env_text.push_back(entry);
-        }
-        std::vector<char*> args;
-        for (const auto& a : argv) args.push_back(const_cast<char*>(a.c_str()));
-        args.push_back(nullptr);
-        std::vector<char*> env;
-        for (const auto& e : env_text) env.push_back(const_cast<char*>(e.c_str()));
-        env.push_back(nullptr);
-
-        posix_spawn_file_actions_t actions;
-        posix_spawn_file_actions_init(&actions);
-        posix_spawn_file_actions_addopen(&actions, 2, output_path.c_str(),
-                                         O_WRONLY | O_CREAT | O_TRUNC, 0600);
-        if (stdout_fd >= 0) {
-            posix_spawn_file_actions_adddup2(&actions, stdout_fd, 1);
-        } else {
-            posix_spawn_file_actions_adddup2(&actions, 2, 1);
-        }
-        if (stdin_fd >= 0) posix_spawn_file_actions_adddup2(&actions, stdin_fd, 0);
-        start_ = std::chrono::steady_clock::now();
-        if (posix_spawn(&pid_, args[0], &actions, nullptr, args.data(), env.data()) != 0) {
-            pid_ = -1;
-        }
-        posix_spawn_file_actions_destroy(&actions);
-    }
-
-    ~Child() { Stop(); }
-
-    pid_t pid() const { return pid_; }
-    std::chrono::steady_clock::time_point start() const { return start_; }
-
-    bool Running() {
-        if (pid_ <= 0) return false;
-        int status = 0;
-        const pid_t r = waitpid(pid_, &status, WNOHANG);
-        if (r == pid_) {
-            pid_ = -1;
-            status_ = status;
-            return false;
-        }
-        return r == 0;
-    }
-
-    // Exit status of the child once it ends by itself within `timeout`, else -1.
-    int Wait(std::chrono::milliseconds timeout) {
-        const auto deadline = std::chrono::steady_clock::now() + timeout;
-        while (Running()) {
-            if (std::chrono::steady_clock::now() >= deadline) return -1;
-            std::this_thread::sleep_for(10ms);
-        }
-        return WIFEXITED(status_) ? WEXITSTATUS(status_) : -1;
-    }
-
-    // Sends `signal` and reaps the child; SIGKILL after 5 s.
-    void Stop(int signal = SIGTERM) {
-        if (pid_ <= 0) return;
-        kill(pid_, signal);
-        const auto deadline = std::chrono::steady_clock::now() + 5s;
-        while (Running() && std::chrono::steady_clock::now() < deadline) {
-            std::this_thread::sleep_for(10ms);
-        }
-        if (pid_ > 0) {
-            kill(pid_, SIGKILL);
-            int status = 0;
-            waitpid(pid_, &status, 0);
-            status_ = status;
-            pid_ = -1;
-        }
-    }
-
-  private:
-    pid_t pid_ = -1;
-    int status_ = 0;
-    std::chrono::steady_clock::time_point start_;
-};
-
-std::vector<std::string> ServiceEnv(const std::string& dir, const std::string& binder_dir) {
+std::map<std::string, std::string> ServiceEnv(const std::string& dir,
+                                              const std::string& binder_dir) {
     const std::string properties = dir + "/build.prop";
     std::ofstream(properties) << "persist.vendor.camera.vyr_supported=true\n"
                               << "persist.vendor.camera.vyr_range_supported=1\n";
-    return {"VYR_BINDER_DIR=" + binder_dir, "VYR_PROPERTY_FILE=" + properties};
+    return {{"VYR_BINDER_DIR", binder_dir}, {"VYR_PROPERTY_FILE", properties}};
 }
 
 ndk::SpAIBinder WaitForRegistration(std::chrono::milliseconds timeout) {
@@ -163,7 +65,7 @@ ndk::SpAIBinder WaitForRegistration(std::chrono::milliseconds timeout) {
 class ServiceProcessTest : public ::testing::Test {
   protected:
     void SetUp() override {
-        dir_ = MakeTempDir();
+        dir_ = MakeTempDir("vyr-service-process-");
         // A service of an earlier test in this process must be gone from the registry.
         const auto deadline = std::chrono::steady_clock::now() + 5s;
         while (std::chrono::steady_clock::now() < deadline) {
@@ -180,13 +82,15 @@ class ServiceProcessTest : public ::testing::Test {
         std::filesystem::remove_all(dir_);
     }
 
-    std::unique_ptr<Child> StartService() {
-        return std::make_unique<Child>(std::vector<std::string>{VYRSERVICE_BINARY},
-                                       ServiceEnv(dir_, g_work_dir + "/binder"),
-                                       dir_ + "/service.log");
+    std::unique_ptr<ChildProcess> StartService() {
+        started_ = std::chrono::steady_clock::now();
+        return std::make_unique<ChildProcess>(std::vector<std::string>{VYRSERVICE_BINARY},
+                                              ServiceEnv(dir_, g_work_dir + "/binder"),
+                                              dir_ + "/service.log");
     }
 
     std::string dir_;
+    std::chrono::steady_clock::time_point started_;
     std::shared_ptr<IVYRService> service_;
 };
 
@@ -195,7 +99,7 @@ TEST_F(ServiceProcessTest, RegistersNoSoonerThanFourSecondsAfterStartAndServes) 
     ASSERT_GT(process->pid(), 0);
     ndk::SpAIBinder binder = WaitForRegistration(30s);
     ASSERT_NE(nullptr, binder.get()) << "vyrservice never registered";
-    EXPECT_GE(std::chrono::steady_clock::now() - process->start(), 4s);
+    EXPECT_GE(std::chrono::steady_clock::now() - started_, 4s);
     service_ = IVYRService::fromBinder(binder);
     ASSERT_NE(nullptr, service_);
 
@@ -246,31 +150,19 @@ TEST_F(ServiceProcessTest, DeadCallbackClientIsDisabledAndClosed) {
     ASSERT_NE(nullptr, binder.get()) << "vyrservice never registered";
     service_ = IVYRService::fromBinder(binder);
 
-    int to_test[2];
-    int to_client[2];
-    ASSERT_EQ(0, pipe2(to_test, O_CLOEXEC));
-    ASSERT_EQ(0, pipe2(to_client, O_CLOEXEC));
-    auto client = std::make_unique<Child>(
-        std::vector<std::string>{g_self, kCallbackClientFlag},
-        std::vector<std::string>{"VYR_BINDER_DIR=" + g_work_dir + "/binder"}, dir_ + "/client.log",
-        to_test[1], to_client[0]);
-    close(to_test[1]);
-    close(to_client[0]);
-
+    ChildProcess client({g_self, kCallbackClientFlag}, {{"VYR_BINDER_DIR", g_work_dir + "/binder"}},
+                        dir_ + "/client.log");
     // The client reports its handle once it is enabled with a callback set twice.
-    std::string line;
-    char c;
-    while (read(to_test[0], &c, 1) == 1 && c != '\n') line += c;
-    close(to_test[0]);
-    ASSERT_FALSE(line.empty()) << ReadFile(dir_ + "/client.log");
-    const int32_t handle = std::stoi(line);
+    const std::optional<std::string> line = client.ReadLine(30s);
+    ASSERT_TRUE(line && !line->empty()) << ReadFile(dir_ + "/client.log");
+    const int32_t handle = std::stoi(*line);
 
     int32_t result = 0;
     ASSERT_TRUE(service_->Enable(handle, 100, &result).isOk());
     EXPECT_EQ(-17, result);
 
-    client->Stop(SIGKILL);
-    close(to_client[1]);
+    client.Signal(SIGKILL);
+    ASSERT_TRUE(client.Wait(10s));
 
     // Both death links fire; the first disables and closes, the second finds nothing.
     const auto deadline = std::chrono::steady_clock::now() + 10s;
@@ -300,8 +192,9 @@ TEST_F(ServiceProcessTest, RegistrationFailureLeavesAnUnreachableRunningProcess)
     // A registry directory below a regular file cannot be created.
     const std::string blocker = dir_ + "/not-a-directory";
     std::ofstream(blocker) << "x";
-    Child process({VYRSERVICE_BINARY}, ServiceEnv(dir_, blocker + "/binder"), dir_ + "/service.log");
-    ASSERT_GT(process.pid(), 0);
+    ChildProcess process({VYRSERVICE_BINARY}, ServiceEnv(dir_, blocker + "/binder"),
+                         dir_ + "/service.log");
+    ASSERT_TRUE(process.started());
     const auto deadline = std::chrono::steady_clock::now() + 30s;
     std::string log;
     while (std::chrono::steady_clock::now() < deadline) {
@@ -321,8 +214,8 @@ TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
     auto process = StartService();
     ASSERT_NE(nullptr, WaitForRegistration(30s).get()) << "vyrservice never registered";
 
-    vyr_test::ChildProcess shell({VYRCTL_BINARY, "--timeout", "10", "shell"},
-                                 {{"VYR_BINDER_DIR", g_work_dir + "/binder"}}, dir_ + "/vyrctl.log");
+    ChildProcess shell({VYRCTL_BINARY, "--timeout", "10", "shell"},
+                       {{"VYR_BINDER_DIR", g_work_dir + "/binder"}}, dir_ + "/vyrctl.log");
     ASSERT_TRUE(shell.started());
     // One command in, one result line out.
     auto run = [&](const std::string& command) -> std::string {
@@ -412,7 +305,7 @@ int main(int argc, char** argv) {
         return RunCallbackClient();
     }
     ::testing::InitGoogleTest(&argc, argv);
-    g_work_dir = MakeTempDir();
+    g_work_dir = MakeTempDir("vyr-service-process-");
     std::filesystem::create_directory(g_work_dir + "/binder");
     setenv("VYR_BINDER_DIR", (g_work_dir + "/binder").c_str(), 1);
     const int status = RUN_ALL_TESTS();

@@ -9,6 +9,8 @@
 #include <sstream>
 #include <thread>
 
+#include "test_files.h"
+
 namespace vyr_test {
 
 using std::chrono::milliseconds;
@@ -18,19 +20,11 @@ namespace {
 
 constexpr milliseconds kPollInterval{50};
 
-std::string ReadFile(const std::string& path) {
-    std::ifstream in(path);
-    std::stringstream text;
-    text << in.rdbuf();
-    return text.str();
-}
-
 }  // namespace
 
 ServiceProcess::ServiceProcess() {
-    char dir_template[] = "/tmp/vyr-datapath.XXXXXX";
-    if (mkdtemp(dir_template) == nullptr) return;
-    dir_ = dir_template;
+    dir_ = MakeTempDir("vyr-service.");
+    if (dir_.empty()) return;
     std::filesystem::create_directory(dir_ + "/binder");
     std::ofstream(dir_ + "/build.prop") << "persist.vendor.camera.vyr_supported=true\n"
                                            "persist.vendor.camera.vyr_range_supported=true\n";

@@ -9,13 +9,14 @@
 #include <map>
 #include <string>
 
+#include "test_files.h"
+
 // A private directory for one test's files, removed with everything in it.
 class TempDir {
   public:
     TempDir() {
-        char path[] = "/tmp/vyr_test_XXXXXX";
-        if (mkdtemp(path) == nullptr) ADD_FAILURE() << "mkdtemp failed";
-        path_ = path;
+        path_ = vyr_test::MakeTempDir("vyr_test_");
+        if (path_.empty()) ADD_FAILURE() << "cannot make a temporary directory";
     }
     ~TempDir() {
         std::error_code ignored;
