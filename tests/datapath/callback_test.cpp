@@ -50,8 +50,8 @@ TEST_F(CallbackTest, CallbackOfAnEnabledClientCannotBeReplaced) {
     int32_t result = 0;
     EXPECT_TRUE(service_->SetCallback(handle, second, &result).isOk());
     EXPECT_EQ(result, -1);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_ERROR,
-                          "SetCallback failed. callback can only be set at DISABLE state"),
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_ERROR,
+                         "SetCallback failed. callback can only be set at DISABLE state"),
               1u);
 
     // The next sample still goes to the first callback.
@@ -130,7 +130,7 @@ TEST_F(CallbackTest, DisableDuringTheSleepEndsTheLoopAtOnce) {
     auto callback = SetCallbackOk(handle);
     constexpr int32_t kLongPeriodMs = 8000;
     EnableOk(handle, kLongPeriodMs);
-    ASSERT_TRUE(log_->WaitFor(kTag, ANDROID_LOG_WARN, "PollInternal, invalid data", kWait));
+    ASSERT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_WARN, "PollInternal, invalid data", kWait));
 
     auto start = steady_clock::now();
     DisableNow(handle);

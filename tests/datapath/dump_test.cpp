@@ -190,9 +190,9 @@ TEST_F(DumpTest, BusyApiLockIsReportedFirstAndTheDumpDoesNotWaitForIt) {
     EnableOk(handle, 1);
     ASSERT_TRUE(callback->WaitForEvents(1, kWait));
     std::thread disabler([this, handle] { service_->Disable(handle); });
-    ASSERT_TRUE(log_->WaitFor(kTag, ANDROID_LOG_INFO,
-                              "DisableInternal handle " + std::to_string(handle) + ", mode 3",
-                              kWait));
+    ASSERT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO,
+                             "DisableInternal handle " + std::to_string(handle) + ", mode 3",
+                             kWait));
 
     std::future<vyr_test::DumpResult> dump = std::async(
         std::launch::async, [this] { return vyr_test::DumpOf(service_->asBinder().get()); });

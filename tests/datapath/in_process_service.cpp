@@ -17,7 +17,6 @@ constexpr size_t kModeBlocks[] = {0, 2};
 
 void InProcessServiceTest::SetUp() {
     sensor_doubles::Reset();
-    log_ = std::make_unique<vyr_test::LogCapture>();
     StartService(true);
 }
 
@@ -26,16 +25,9 @@ void InProcessServiceTest::StartService(bool als_property) {
         WaitForIdleWorkers();
         service_.reset();
     }
-    ServiceConfig config;
-    config.get_bool_property = [als_property](const char* key, bool default_value) {
-        if (std::string(key) == "persist.vendor.camera.vyr_supported") return als_property;
-        if (std::string(key) == "persist.vendor.camera.vyr_range_supported") return true;
-        return default_value;
-    };
-    config.startup_delay = std::chrono::milliseconds(0);
     // No panel here: the display monitor stops at once and never enables the light sensor.
-    config.display_state_path = "/nonexistent/vyr-datapath/panel/state";
-    service_ = ndk::SharedRefBase::make<VYRService>(config);
+    service_ = ndk::SharedRefBase::make<VYRService>(
+        Config({{vyr_test::kAlsProperty, als_property}, {vyr_test::kRangeProperty, true}}));
 }
 
 void InProcessServiceTest::TearDown() {
@@ -45,14 +37,10 @@ void InProcessServiceTest::TearDown() {
     for (int32_t handle : opened_) service_->Close(handle);
     WaitForIdleWorkers();
     service_.reset();
-    callback_binders_.clear();
-    log_.reset();
 }
 
 std::shared_ptr<RecordingCallback> InProcessServiceTest::NewCallback() {
-    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
-    callback_binders_.push_back(callback->asBinder());
-    return callback;
+    return ndk::SharedRefBase::make<RecordingCallback>();
 }
 
 int32_t InProcessServiceTest::OpenOk(int32_t mode) {

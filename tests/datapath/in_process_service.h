@@ -16,6 +16,7 @@
 #include "log_capture.h"
 #include "recording_callback.h"
 #include "sensor_doubles.h"
+#include "service_fixture.h"
 #include "vyrservice.h"
 #include "vyrservice_test_peer.h"
 
@@ -25,10 +26,10 @@ using vyr_test::RecordingCallback;
 
 constexpr int32_t kAls = 1;
 constexpr int32_t kRange = 3;
-constexpr char kTag[] = "vyrservice";
-constexpr std::chrono::milliseconds kWait{5000};
+using vyr_test::kTag;
+using vyr_test::kWait;
 
-class InProcessServiceTest : public ::testing::Test {
+class InProcessServiceTest : public vyr_test::ServiceFixture {
   protected:
     void SetUp() override;
     void TearDown() override;
@@ -54,18 +55,13 @@ class InProcessServiceTest : public ::testing::Test {
 
     static const char* ReadCallOf(int32_t mode);
 
-    // A callback whose binder this fixture keeps alive. The service holds a callback's binder
-    // without a reference of its own, counting on the callback to keep it, which a remote proxy
-    // does and a local object does not.
     std::shared_ptr<RecordingCallback> NewCallback();
 
-    std::unique_ptr<vyr_test::LogCapture> log_;
     std::shared_ptr<android::vyr::binder::VYRService> service_;
 
   private:
     std::set<int32_t> opened_;
     std::set<int32_t> enabled_;
-    std::vector<ndk::SpAIBinder> callback_binders_;
     const char* held_call_ = nullptr;
 };
 

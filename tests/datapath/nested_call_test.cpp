@@ -41,7 +41,7 @@ class NestedCallTest : public InProcessServiceTest {
     }
 
     bool Logged(int priority, const std::string& message) {
-        return log_->WaitFor(kTag, priority, message, kWait);
+        return log_.WaitFor(kTag, priority, message, kWait);
     }
     std::string HandleAndMode() { return "handle " + std::to_string(handle_) + ", mode 3"; }
     // Back to the range worker alone: the notification and processing threads are gone.
@@ -119,7 +119,7 @@ TEST_F(NestedCallTest, EnableAfterANestedDisableStartsOneNewThread) {
     ASSERT_TRUE(callback_->WaitForEvents(2, kWait)) << "the new notification thread delivers";
     ASSERT_EQ(nested_result.wait_for(kWait), std::future_status::ready);
     EXPECT_EQ(nested_result.get(), 0);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_INFO, "Enable " + HandleAndMode()), 2u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_INFO, "Enable " + HandleAndMode()), 2u);
     // The old thread has ended; one notification thread and the range worker remain.
     EXPECT_TRUE(vyr_test::WaitForThreadCount(idle_threads_ + 2, kWait))
         << "the processing thread and one notification thread";

@@ -65,13 +65,13 @@ TEST_F(ParametersTest, WrongValueCountIsRefusedWithItsSize) {
     EXPECT_EQ(Configure(handle, std::vector<int32_t>(12, 1)), -22);
     EXPECT_EQ(Configure(handle, {}), -22);
     EXPECT_EQ(
-        log_->Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters data size 10 is not equal to 11"),
+        log_.Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters data size 10 is not equal to 11"),
         1u);
     EXPECT_EQ(
-        log_->Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters data size 12 is not equal to 11"),
+        log_.Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters data size 12 is not equal to 11"),
         1u);
     EXPECT_EQ(
-        log_->Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters data size 0 is not equal to 11"),
+        log_.Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters data size 0 is not equal to 11"),
         1u);
     EXPECT_EQ(sensor_doubles::CountOf(sensor_doubles::kRangeConfigureParameters), 0u);
 }
@@ -80,14 +80,14 @@ TEST_F(ParametersTest, LightClientCannotConfigure) {
     int32_t handle = OpenOk(kAls);
     EXPECT_EQ(Configure(handle, std::vector<int32_t>(11, 0)), -22);
     EXPECT_EQ(Configure(handle, std::vector<int32_t>(3, 0)), -22);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters, mode 1 is not supported"),
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters, mode 1 is not supported"),
               2u);
     EXPECT_EQ(sensor_doubles::CountOf(sensor_doubles::kRangeConfigureParameters), 0u);
 }
 
 TEST_F(ParametersTest, UnknownHandleCannotConfigure) {
     EXPECT_EQ(Configure(4242, std::vector<int32_t>(11, 0)), -38);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters invalid handle 4242"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters invalid handle 4242"), 1u);
     EXPECT_EQ(sensor_doubles::CountOf(sensor_doubles::kRangeConfigureParameters), 0u);
 }
 
@@ -98,16 +98,16 @@ TEST_F(ParametersTest, TorchStateIsNarrowedToItsLowByte) {
     ASSERT_EQ(calls.size(), 2u);
     EXPECT_EQ(calls[0].args, std::vector<int64_t>{1});
     EXPECT_EQ(calls[1].args, std::vector<int64_t>{255});
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_INFO, "torch state changed to 257"), 1u);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_INFO, "torch state changed to -1"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_INFO, "torch state changed to 257"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_INFO, "torch state changed to -1"), 1u);
 }
 
 TEST_F(ParametersTest, TorchWithoutLightSensorDoesNothing) {
     StartService(false);
-    log_->Clear();
+    log_.Clear();
     EXPECT_TRUE(service_->SetTorchLightState(1).isOk());
     EXPECT_EQ(sensor_doubles::CountOf(sensor_doubles::kAlsSetTorchLightState), 0u);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_INFO, "torch state changed to 1"), 0u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_INFO, "torch state changed to 1"), 0u);
 }
 
 TEST_F(ParametersTest, UnknownHandleResultPerMethod) {
@@ -130,10 +130,10 @@ TEST_F(ParametersTest, UnknownHandleResultPerMethod) {
     EXPECT_TRUE(service_->Disable(kUnknown).isOk());
     EXPECT_TRUE(service_->Close(kUnknown).isOk());
 
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_ERROR, "Enable invalid handle 31337"), 1u);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_ERROR, "EnableLowPower invalid handle 31337"), 1u);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_WARN, "SetCallback invalid handle 31337"), 1u);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_WARN, "DisableInternal invalid handle 31337"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_ERROR, "Enable invalid handle 31337"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_ERROR, "EnableLowPower invalid handle 31337"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, "SetCallback invalid handle 31337"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, "DisableInternal invalid handle 31337"), 1u);
     // Nothing was queued for a worker.
     EXPECT_EQ(sensor_doubles::CountOf(sensor_doubles::kRangeInit), 0u);
 }

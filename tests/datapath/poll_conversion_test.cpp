@@ -193,7 +193,7 @@ TEST_F(PollTest, EachHandleTakesASampleOnce) {
     EXPECT_EQ(fresh.timestamp, 5);
     ASSERT_EQ(Poll(other, &fresh), 0);
     EXPECT_EQ(fresh.timestamp, 5);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_WARN, kInvalidData), 0u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 0u);
 }
 
 TEST_F(PollTest, NoSampleYetIsInvalidDataLoggedOnce) {
@@ -201,11 +201,11 @@ TEST_F(PollTest, NoSampleYetIsInvalidDataLoggedOnce) {
     Event event = Sentinel();
     EXPECT_EQ(Poll(handle, &event), -61);
     ExpectSentinel(event);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
 
     EXPECT_EQ(Poll(handle, &event), -61);
     ExpectSentinel(event);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
 }
 
 TEST_F(PollTest, InvalidSampleIsLoggedOnceAndLeavesTheEventAlone) {
@@ -214,15 +214,15 @@ TEST_F(PollTest, InvalidSampleIsLoggedOnceAndLeavesTheEventAlone) {
     sensor_doubles::SetRangeData(frame);
     int32_t handle = OpenOk(kRange);
     StartHeldSampling(handle, kRange);
-    log_->Clear();
+    log_.Clear();
 
     Event event = Sentinel();
     EXPECT_EQ(Poll(handle, &event), -61);
     ExpectSentinel(event);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
     EXPECT_EQ(Poll(handle, &event), -61);
     ExpectSentinel(event);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
 
     // An invalid ambient-light sample too.
     ALSResult als = AlsSample();
@@ -243,7 +243,7 @@ TEST_F(PollTest, UnknownHandleIsInvalidArgument) {
     EXPECT_TRUE(status.isOk());
     EXPECT_EQ(result, -22);
     ExpectSentinel(event);
-    EXPECT_EQ(log_->Count(kTag, ANDROID_LOG_ERROR, "PollOnce, invalid handle"), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_ERROR, "PollOnce, invalid handle"), 1u);
 }
 
 TEST_F(PollTest, StoredSampleOutlivesSampling) {

@@ -33,7 +33,7 @@ TEST_F(AttributeContentTest, ReadErrorWhileDarkLogsAndQueuesNothing) {
     ASSERT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 1); }));
     const int32_t display = DisplayHandle();
     EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, EnableWorkText(1, display, 1000, 1000), kWait));
-    EXPECT_EQ(0u, WorkLines("DisableWork", display));
+    EXPECT_EQ(0u, WorkLogCount("DisableWork", display));
     EXPECT_EQ(0u, DisableLines("On\n"));
 }
 
@@ -50,7 +50,7 @@ TEST_F(AttributeContentTest, ReadErrorWhileLitDisablesAsDark) {
     fuse_->Notify();
     ASSERT_TRUE(
         log_.WaitFor(kTag, ANDROID_LOG_ERROR, std::string(kReadError) + strerror(EIO), kWait));
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 1));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", display, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000)));
     EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).running);
     // The error path logs no display-state line of its own.
@@ -63,8 +63,8 @@ TEST_F(AttributeContentTest, ReadErrorWhileLitDisablesAsDark) {
     fuse_->FailReads(0);
     fuse_->Set("On\n");
     ASSERT_TRUE(WaitForEnableLine("On\n", 2));
-    ASSERT_TRUE(WaitForWorkLines("EnableWork", display, 2));
-    EXPECT_EQ(1u, WorkLines("DisableWork", display));
+    ASSERT_TRUE(WaitForWorkLog("EnableWork", display, 2));
+    EXPECT_EQ(1u, WorkLogCount("DisableWork", display));
     EXPECT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 1); }));
 }
 
@@ -90,7 +90,7 @@ TEST_F(AttributeContentTest, ContentIsJudgedAsReadWithoutANewline) {
     fuse_->Set("hbm on ON");
     ASSERT_TRUE(WaitForDisableLine("hbm on ON"));
     // The worker may lag behind the monitor: wait until it has applied every item.
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 3));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", display, 3));
     EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).enable_count);
 }
 

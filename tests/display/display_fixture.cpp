@@ -14,9 +14,6 @@
 namespace vyr_display_test {
 namespace {
 
-constexpr char kAlsProperty[] = "persist.vendor.camera.vyr_supported";
-constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_supported";
-
 bool UnderCi() {
     const char* ci = getenv("CI");
     return ci != nullptr && std::string(ci) == "true";
@@ -99,15 +96,8 @@ void DisplayTest::MakeServiceOnFuse() {
 }
 
 void DisplayTest::MakeService(bool als, bool range, const std::string& path) {
-    ServiceConfig config;
-    config.get_bool_property = [als, range](const char* key, bool default_value) {
-        if (std::string(key) == kAlsProperty) return als;
-        if (std::string(key) == kRangeProperty) return range;
-        return default_value;
-    };
-    config.startup_delay = 0ms;
-    config.display_state_path = path;
-    service_ = ndk::SharedRefBase::make<VYRService>(config);
+    service_ = ndk::SharedRefBase::make<VYRService>(
+        Config({{vyr_test::kAlsProperty, als}, {vyr_test::kRangeProperty, range}}, path));
 }
 
 bool DisplayTest::DestroyService() {
@@ -191,18 +181,6 @@ bool DisplayTest::NotifyUntil(const std::function<bool()>& done, std::chrono::mi
         std::this_thread::sleep_for(20ms);
     }
     return true;
-}
-
-size_t DisplayTest::WorkLines(const std::string& work, int32_t handle) {
-    return vyr_test::CountWorkLogs(log_.Records(), work, handle);
-}
-
-bool DisplayTest::WaitForWorkLines(const std::string& work, int32_t handle, size_t count) {
-    return log_.WaitUntil(
-        [&](const std::vector<vyr_test::LogRecord>& records) {
-            return vyr_test::CountWorkLogs(records, work, handle) >= count;
-        },
-        kWait);
 }
 
 std::string DisplayTest::EnableWorkText(int32_t count, int32_t handle, int32_t period,

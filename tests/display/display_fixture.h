@@ -14,6 +14,7 @@
 #include "fuse_attribute.h"
 #include "log_capture.h"
 #include "sensor_doubles.h"
+#include "service_fixture.h"
 #include "thread_count.h"
 #include "vyrservice.h"
 #include "vyrservice_test_peer.h"
@@ -25,8 +26,8 @@ using android::vyr::binder::ServiceConfig;
 using android::vyr::binder::VYRService;
 using namespace std::chrono_literals;
 
-inline constexpr char kTag[] = "vyrservice";
-inline constexpr auto kWait = 10s;
+using vyr_test::kTag;
+using vyr_test::kWait;
 // The kernel's hostname attribute: poll() reports POLLPRI|POLLERR on every sethostname(), and a
 // read returns this namespace's hostname and a newline.
 inline constexpr char kStatePath[] = "/proc/sys/kernel/hostname";
@@ -40,7 +41,7 @@ using vyr_test::WaitForThreadCount;
 // Builds the service on the sensor doubles with the display monitor watching the hostname
 // attribute, and drives the "panel" through sethostname(). Needs a UTS namespace of its own
 // (root); skips without one, and fails under CI=true.
-class DisplayTest : public ::testing::Test {
+class DisplayTest : public vyr_test::ServiceFixture {
   protected:
     void SetUp() override;
     void TearDown() override;
@@ -78,9 +79,6 @@ class DisplayTest : public ::testing::Test {
     // Notifies the display monitor's attribute again every 20 ms (waking the monitor without
     // changing what it reads) until `done` is true; false on time-out.
     bool NotifyUntil(const std::function<bool()>& done, std::chrono::milliseconds timeout);
-    // Records of the worker's "EnableWork"/"DisableWork" line for `handle`.
-    size_t WorkLines(const std::string& work, int32_t handle);
-    bool WaitForWorkLines(const std::string& work, int32_t handle, size_t count);
     // Exact text of the worker's lines for mode 1.
     static std::string EnableWorkText(int32_t count, int32_t handle, int32_t period, int32_t active);
     static std::string DisableWorkText(int32_t count, int32_t handle, int32_t active);
@@ -88,7 +86,6 @@ class DisplayTest : public ::testing::Test {
     // The only handle with a period in the light block: the display's, while no client enabled.
     int32_t DisplayHandle();
 
-    vyr_test::LogCapture log_;
     std::shared_ptr<VYRService> service_;
     size_t baseline_threads_ = 0;
     std::string baseline_names_;

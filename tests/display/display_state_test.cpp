@@ -92,8 +92,8 @@ TEST_F(DisplayStateTest, OffLowerCaseOnAndEmptyAreDark) {
         ASSERT_TRUE(WaitForDisableLine(dark + "\n"));
     }
     // The worker may lag behind the monitor: wait until it has applied every item.
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 3));
-    EXPECT_EQ(3u, WorkLines("EnableWork", display));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", display, 3));
+    EXPECT_EQ(3u, WorkLogCount("EnableWork", display));
     EXPECT_EQ(3u, EnableLines("On\n"));
     const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(0, block.enable_count);
@@ -115,11 +115,11 @@ TEST_F(DisplayStateTest, RepeatedLitNotificationsQueueOneEnable) {
     }
     Panel("Off");
     ASSERT_TRUE(WaitForDisableLine("Off\n"));
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 1));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", display, 1));
     EXPECT_EQ(1u, EnableLines("On\n"));
     EXPECT_EQ(0u, EnableLines("HBM\n"));
     EXPECT_EQ(0u, EnableLines("On On\n"));
-    EXPECT_EQ(1u, WorkLines("EnableWork", display));
+    EXPECT_EQ(1u, WorkLogCount("EnableWork", display));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000)));
     EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).enable_count);
 }
@@ -136,7 +136,7 @@ TEST_F(DisplayStateTest, RepeatedDarkNotificationsQueueNothing) {
     ASSERT_TRUE(WaitForEnableLine("On\n"));
     ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
     const int32_t display = DisplayHandle();
-    EXPECT_EQ(0u, WorkLines("DisableWork", display));
+    EXPECT_EQ(0u, WorkLogCount("DisableWork", display));
     EXPECT_EQ(0u, DisableLines("Off\n") + DisableLines("Offline\n") + DisableLines("off\n"));
     Panel("Off");
     ASSERT_TRUE(WaitForDisableLine("Off\n"));
@@ -164,7 +164,7 @@ TEST_F(DisplayStateTest, OnlyTheFirstFortyNineBytesAreJudged) {
     ASSERT_TRUE(WaitForEnableLine("HBM" + std::string(46, 'y')));
     Panel("Off");
     ASSERT_TRUE(WaitForDisableLine("Off\n"));
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 3));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", display, 3));
     EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).enable_count);
 }
 
@@ -183,7 +183,7 @@ TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
     int32_t result = 1;
     ASSERT_TRUE(service_->Enable(client, 200, &result).isOk());
     ASSERT_EQ(0, result);
-    ASSERT_TRUE(WaitForWorkLines("EnableWork", client, 1));
+    ASSERT_TRUE(WaitForWorkLog("EnableWork", client, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableWorkText(2, client, 200, 200)));
     auto block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(2, block.enable_count);
@@ -191,7 +191,7 @@ TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
     EXPECT_EQ((std::unordered_map<int32_t, int32_t>{{display, 1000}, {client, 200}}), block.periods);
 
     ASSERT_TRUE(service_->Disable(client).isOk());
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", client, 1));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", client, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(1, client, 1000)));
     block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(1, block.enable_count);
@@ -202,7 +202,7 @@ TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
 
     Panel("Off");
     ASSERT_TRUE(WaitForDisableLine("Off\n"));
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", display, 1));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", display, 1));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000)));
     block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
     EXPECT_EQ(0, block.enable_count);

@@ -125,9 +125,9 @@ TEST_F(ShutdownTest, ItemsStillQueuedAreDiscarded) {
     ASSERT_EQ(1u, CountOf(kRangeEnable));
     EXPECT_EQ((std::vector<int64_t>{1}), CallsNamed(kRangeEnable).front().args);
     EXPECT_EQ(0u, CountOf(kRangeUninit));
-    EXPECT_EQ(1u, WorkLines("EnableWork", first));
-    EXPECT_EQ(0u, WorkLines("DisableWork", first));
-    EXPECT_EQ(0u, WorkLines("EnableWork", second));
+    EXPECT_EQ(1u, WorkLogCount("EnableWork", first));
+    EXPECT_EQ(0u, WorkLogCount("DisableWork", first));
+    EXPECT_EQ(0u, WorkLogCount("EnableWork", second));
     const auto names = CallNames();
     ASSERT_GE(names.size(), 2u);
     EXPECT_EQ((std::vector<std::string>{kAlsDestroy, kRangeDestroy}),
@@ -156,7 +156,7 @@ TEST_F(ShutdownTest, OpenClientsHaveTheirNotificationThreadsJoined) {
     // The second Process() call begins after the first one's sample was stored.
     ASSERT_TRUE(sensor_doubles::WaitForCalls(kRangeProcess, 2, kWait));
     ASSERT_TRUE(service_->Disable(sampler).isOk());
-    ASSERT_TRUE(WaitForWorkLines("DisableWork", sampler, 1));
+    ASSERT_TRUE(WaitForWorkLog("DisableWork", sampler, 1));
 
     // Enabled with a failing Init(): a notification thread but no processing thread, so the
     // service can be destroyed with this client still enabled and open.
@@ -164,7 +164,7 @@ TEST_F(ShutdownTest, OpenClientsHaveTheirNotificationThreadsJoined) {
     ASSERT_TRUE(service_->Enable(pushed, 10, &result).isOk());
     ASSERT_EQ(0, result);
     ASSERT_TRUE(callback->WaitForEvent());
-    ASSERT_TRUE(WaitForWorkLines("EnableWork", pushed, 1));
+    ASSERT_TRUE(WaitForWorkLog("EnableWork", pushed, 1));
 
     const size_t threads_with_client = ThreadCount();
     std::future<void> destroyed = StartDestruction();

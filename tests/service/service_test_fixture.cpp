@@ -17,18 +17,6 @@ void ServiceTest::TearDown() {
         << "threads left: " << ThreadCount() << ", expected " << baseline_threads_;
 }
 
-ServiceConfig ServiceTest::Config(std::map<std::string, bool> properties,
-                                  const std::string& display_path) {
-    ServiceConfig config;
-    config.get_bool_property = [properties](const char* key, bool default_value) {
-        auto it = properties.find(key);
-        return it == properties.end() ? default_value : it->second;
-    };
-    config.startup_delay = 0ms;
-    config.display_state_path = display_path;
-    return config;
-}
-
 void ServiceTest::MakeService(bool als, bool range) {
     MakeService(Config({{kAlsProperty, als}, {kRangeProperty, range}}));
     // Settle on the workers alone: the display monitor ends on the unopenable path.
@@ -44,10 +32,6 @@ void ServiceTest::MakeService(const ServiceConfig& config) {
 void ServiceTest::DestroyService() {
     service_.reset();
     impl_.reset();
-}
-
-size_t ServiceTest::BlockOf(int32_t mode) {
-    return mode == 3 ? 2 : 0;
 }
 
 int32_t ServiceTest::Open(int32_t mode) {
@@ -79,18 +63,6 @@ void ServiceTest::DisableAndWait(int32_t handle) {
     EXPECT_TRUE(WaitForWorkLog("DisableWork", handle, before + 1));
     // The worker logs before its last library call; the snapshot waits for the whole item.
     vyr_test::ServicePeer::SnapshotModeBlock(*impl_, BlockOf(modes_[handle]));
-}
-
-size_t ServiceTest::WorkLogCount(const std::string& work, int32_t handle) {
-    return vyr_test::CountWorkLogs(log_.Records(), work, handle);
-}
-
-bool ServiceTest::WaitForWorkLog(const std::string& work, int32_t handle, size_t count) {
-    return log_.WaitUntil(
-        [&](const std::vector<vyr_test::LogRecord>& records) {
-            return vyr_test::CountWorkLogs(records, work, handle) >= count;
-        },
-        kWait);
 }
 
 }  // namespace vyr_service_test

@@ -13,6 +13,7 @@
 #include "log_capture.h"
 #include "recording_callback.h"
 #include "sensor_doubles.h"
+#include "service_fixture.h"
 #include "thread_count.h"
 #include "vyrservice.h"
 #include "vyrservice_test_peer.h"
@@ -27,46 +28,35 @@ using android::vyr::binder::ServiceConfig;
 using android::vyr::binder::VYRService;
 using namespace std::chrono_literals;
 
-inline constexpr char kTag[] = "vyrservice";
-inline constexpr char kAlsProperty[] = "persist.vendor.camera.vyr_supported";
-inline constexpr char kRangeProperty[] = "persist.vendor.camera.vyr_range_supported";
-// A display-state path that cannot be opened: the display monitor ends at once.
-inline constexpr char kNoDisplayPath[] = "/nonexistent/vyr-service-test/display-state";
-inline constexpr auto kWait = 10s;
-
 using vyr_test::Hex;
+using vyr_test::kAlsProperty;
+using vyr_test::kNoDisplayPath;
+using vyr_test::kRangeProperty;
+using vyr_test::kTag;
+using vyr_test::kWait;
 using vyr_test::RecordingCallback;
 using vyr_test::ThreadCount;
 using vyr_test::WaitForThreadCount;
 
 // Builds the service on the sensor doubles with a scripted property source and no start-up
 // delay. Checks at the end of each test that no thread of the service is left.
-class ServiceTest : public ::testing::Test {
+class ServiceTest : public vyr_test::ServiceFixture {
   protected:
     void SetUp() override;
     void TearDown() override;
 
-    ServiceConfig Config(std::map<std::string, bool> properties,
-                         const std::string& display_path = kNoDisplayPath);
     // Both sensors present unless said otherwise; returns once the display monitor has ended.
     void MakeService(bool als = true, bool range = true);
     void MakeService(const ServiceConfig& config);
     // Drops the test's reference; the service is destroyed here.
     void DestroyService();
 
-    // Index of the mode block that serves `mode`.
-    static size_t BlockOf(int32_t mode);
     int32_t Open(int32_t mode);
     int32_t Enable(int32_t handle, int32_t period);
     // Opens a client of `mode` and enables it; waits until the worker has applied the item.
     int32_t OpenAndEnable(int32_t mode, int32_t period);
     // Disables and waits until the worker has applied the item.
     void DisableAndWait(int32_t handle);
-    // Number of records of `work` ("EnableWork" / "DisableWork") for `handle`.
-    size_t WorkLogCount(const std::string& work, int32_t handle);
-    bool WaitForWorkLog(const std::string& work, int32_t handle, size_t count = 1);
-
-    vyr_test::LogCapture log_;
     std::shared_ptr<VYRService> impl_;
     std::shared_ptr<IVYRService> service_;
     size_t baseline_threads_ = 0;
