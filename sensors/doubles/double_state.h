@@ -13,9 +13,9 @@
 
 namespace sensor_doubles {
 
-// The one recorder and script shared by both doubles and the test-facing functions.
-class DoubleState {
-  public:
+// The one recorder and script shared by both doubles and the test-facing functions of
+// sensor_doubles.h, which work on its fields directly.
+struct DoubleState {
     static DoubleState& Get();
 
     // Records the call, then blocks while the name is held, then sleeps its delay. Returns the
@@ -31,24 +31,6 @@ class DoubleState {
     // The library's instance, whose enabled flag every recorded call samples.
     void SetAlsInstance(AmbientLightSensor* instance);
 
-    void Reset();
-    std::vector<Call> Calls();
-    std::vector<Call> CallsNamed(const std::string& name);
-    size_t CountOf(const std::string& name);
-    bool WaitForCalls(const std::string& name, size_t count, std::chrono::milliseconds timeout);
-    void SetAlsCreateFails(bool fails);
-    void SetRangeCreateFails(bool fails);
-    void SetResult(const std::string& name, int result);
-    void SetRangeData(const MultiRangingData& data);
-    void QueueRangeData(const MultiRangingData& data);
-    void SetAlsData(const ALSResult& data);
-    void QueueAlsData(const ALSResult& data);
-    void SetDelay(const std::string& name, std::chrono::milliseconds delay);
-    void Hold(const std::string& name);
-    void Release(const std::string& name);
-    bool WaitUntilHeld(const std::string& name, std::chrono::milliseconds timeout);
-
-  private:
     struct HoldState {
         bool held = false;
         // Bumped by every release so a blocked call cannot miss one that is followed at once by
@@ -58,23 +40,22 @@ class DoubleState {
         size_t blocked = 0;
     };
 
-    DoubleState() = default;
     size_t CountLocked(const std::string& name) const;
     void ReleaseLocked(HoldState& hold);
 
-    std::mutex mutex_;
-    std::condition_variable changed_;
-    std::vector<Call> calls_;
-    std::map<std::string, int> results_;
-    std::map<std::string, std::chrono::milliseconds> delays_;
-    std::map<std::string, HoldState> holds_;
-    std::deque<MultiRangingData> range_queue_;
-    std::deque<ALSResult> als_queue_;
-    MultiRangingData range_data_{};
-    ALSResult als_data_{};
-    bool als_create_fails_ = false;
-    bool range_create_fails_ = false;
-    AmbientLightSensor* als_instance_ = nullptr;
+    std::mutex mutex;
+    std::condition_variable changed;
+    std::vector<Call> calls;
+    std::map<std::string, int> results;
+    std::map<std::string, std::chrono::milliseconds> delays;
+    std::map<std::string, HoldState> holds;
+    std::deque<MultiRangingData> range_queue;
+    std::deque<ALSResult> als_queue;
+    MultiRangingData range_data{};
+    ALSResult als_data{};
+    bool als_create_fails = false;
+    bool range_create_fails = false;
+    AmbientLightSensor* als_instance = nullptr;
 };
 
 }  // namespace sensor_doubles
