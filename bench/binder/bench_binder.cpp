@@ -8,6 +8,7 @@
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <benchmark/benchmark.h>
+#include <sched.h>
 #include <signal.h>
 #include <spawn.h>
 #include <stdlib.h>
@@ -234,9 +235,26 @@ int Echo(int fd) {
 
 }  // namespace
 
+// With VYR_BENCH_PEER_CPU set, the peer runs on that CPU alone: bench/run places the two
+// processes on one CPU or on two.
+void PinPeer() {
+    const char* cpu = getenv("VYR_BENCH_PEER_CPU");
+    if (cpu == nullptr) return;
+    cpu_set_t set;
+    CPU_ZERO(&set);
+    CPU_SET(atoi(cpu), &set);
+    sched_setaffinity(0, sizeof(set), &set);
+}
+
 int main(int argc, char** argv) {
-    if (argc == 3 && strcmp(argv[1], "--serve") == 0) return Serve(argv[2]);
-    if (argc == 3 && strcmp(argv[1], "--echo") == 0) return Echo(atoi(argv[2]));
+    if (argc == 3 && strcmp(argv[1], "--serve") == 0) {
+        PinPeer();
+        return Serve(argv[2]);
+    }
+    if (argc == 3 && strcmp(argv[1], "--echo") == 0) {
+        PinPeer();
+        return Echo(atoi(argv[2]));
+    }
 
     // A registry of our own, so the benchmark never meets another run's services.
     char templ[] = "/tmp/vyr-binder-bench-XXXXXX";

@@ -8,7 +8,7 @@
 namespace sensors_sim {
 namespace {
 
-// How often the sampling thread looks at the enabled flag.
+// How often the watcher looks at the enabled flag while the sensor is on.
 constexpr std::chrono::milliseconds kWatchInterval{10};
 constexpr uint8_t kStatusOk = 0;
 constexpr uint8_t kStatusInvalid = 1;
@@ -44,6 +44,13 @@ int AlsSimulator::ReadSingleShot(ALSResult* result, bool wait, unsigned char int
         std::lock_guard<std::mutex> lock(mutex_);
         index = next_index_++;
         torch_lit = torch_state_ != 0;
+        // The service reads as soon as it has switched the sensor on: the watcher learns of it
+        // here, and watches the flag only from now on.
+        if (enabled_->load() && !seen_enabled_) {
+            seen_enabled_ = true;
+            PublishLocked();
+            stop_.notify_all();
+        }
     }
     if (wait) {
         std::this_thread::sleep_for(std::chrono::milliseconds(integration_ms) +
@@ -79,12 +86,18 @@ int AlsSimulator::SetTorchLightState(unsigned char state) {
     return 0;
 }
 
+// The library sees the flag go off only by looking at it, so it looks, but only while the sensor
+// is on: an idle sensor costs no wake-ups.
 void AlsSimulator::WatchEnabled() {
     std::unique_lock<std::mutex> lock(mutex_);
-    while (!stop_.wait_for(lock, kWatchInterval, [this] { return stopping_; })) {
-        const bool enabled = enabled_->load();
-        if (enabled != seen_enabled_) {
-            seen_enabled_ = enabled;
+    while (!stopping_) {
+        if (!seen_enabled_) {
+            stop_.wait(lock);
+            continue;
+        }
+        stop_.wait_for(lock, kWatchInterval);
+        if (seen_enabled_ && !enabled_->load()) {
+            seen_enabled_ = false;
             PublishLocked();
         }
     }

@@ -384,6 +384,9 @@ TEST_F(SensorSimulatorTest, StateFileFollowsTheSensors) {
     ASSERT_NE(als, nullptr);
     EXPECT_TRUE(WaitForState("als.enabled", "0"));
     als->enabled = true;
+    // The simulator learns of the flag at the next read, which the service makes at once.
+    ALSResult reading{};
+    als->ReadSingleShot(&reading, false, 30);
     EXPECT_TRUE(WaitForState("als.enabled", "1"));
     als->SetTorchLightState(1);
     EXPECT_TRUE(WaitForState("torch", "1"));
