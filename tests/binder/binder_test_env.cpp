@@ -4,12 +4,12 @@
 
 #include <filesystem>
 
+#include "test_files.h"
+
 namespace vyr_binder_test {
 
 ScopedRegistryDir::ScopedRegistryDir() {
-    char templ[] = "/tmp/vyr-binder-test-XXXXXX";
-    const char* made = mkdtemp(templ);
-    path_ = made == nullptr ? std::string() : made;
+    path_ = vyr_test::MakeTempDir("vyr-binder-test-");
     setenv("VYR_BINDER_DIR", path_.c_str(), 1);
 }
 

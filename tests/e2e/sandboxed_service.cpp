@@ -13,6 +13,8 @@
 #include <functional>
 #include <thread>
 
+#include "test_files.h"
+
 namespace vyr_e2e {
 namespace {
 
@@ -43,12 +45,11 @@ int RemoveEntry(const char* path, const struct stat*, int, FTW*) {
 }  // namespace
 
 SandboxedService::SandboxedService(const Options& options) {
-    char dir[] = "/tmp/vyr-e2e.XXXXXX";
-    if (mkdtemp(dir) == nullptr) {
+    dir_ = vyr_test::MakeTempDir("vyr-e2e.");
+    if (dir_.empty()) {
         problem_ = "cannot create a temporary directory";
         return;
     }
-    dir_ = dir;
     mkdir((dir_ + "/binder").c_str(), 0700);
     std::string properties;
     for (const auto& [key, value] : options.properties) properties += key + "=" + value + "\n";

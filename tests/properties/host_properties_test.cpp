@@ -6,6 +6,8 @@
 #include <fstream>
 #include <string>
 
+#include "test_files.h"
+
 namespace {
 
 constexpr char kKey[] = "persist.vendor.camera.vyr_supported";
@@ -14,9 +16,8 @@ constexpr char kKey[] = "persist.vendor.camera.vyr_supported";
 class HostPropertiesTest : public ::testing::Test {
   protected:
     void SetUp() override {
-        char dir_template[] = "/tmp/vyr_properties_XXXXXX";
-        ASSERT_NE(mkdtemp(dir_template), nullptr);
-        dir_ = dir_template;
+        dir_ = vyr_test::MakeTempDir("vyr_properties_");
+        ASSERT_FALSE(dir_.empty());
         path_ = dir_ + "/build.prop";
         setenv("VYR_PROPERTY_FILE", path_.c_str(), 1);
     }

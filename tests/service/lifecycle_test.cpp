@@ -9,6 +9,7 @@
 #include <thread>
 
 #include "service_test_fixture.h"
+#include "test_files.h"
 
 namespace vyr_service_test {
 namespace {
@@ -38,8 +39,7 @@ std::vector<std::string> CallNames() {
 class Fifo {
   public:
     Fifo() {
-        char dir[] = "/tmp/vyr-service-test-XXXXXX";
-        dir_ = mkdtemp(dir);
+        dir_ = vyr_test::MakeTempDir("vyr-service-test-");
         path_ = dir_ + "/state";
         mkfifo(path_.c_str(), 0600);
     }
