@@ -26,7 +26,9 @@ using DeathCookie = std::pair<AIBinder*, VYRService*>;
 constexpr int32_t kClientDisabled = 0;
 constexpr int32_t kClientEnabled = 1;
 
-// One open client of the service.
+// One open client of the service. Its fields are guarded by the service's API lock, except the
+// atomics and what the notification thread owns while it runs; no annotation here can name a lock
+// that lives in the service.
 struct ClientEntry {
     explicit ClientEntry(int32_t client_mode) : mode(client_mode) {}
     ~ClientEntry();
