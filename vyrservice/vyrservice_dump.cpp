@@ -2,7 +2,6 @@
 
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <map>
@@ -16,8 +15,8 @@ namespace {
 
 using std::chrono::steady_clock;
 
-// The longest the dump waits for any lock: it must never hold up the service for long, nor
-// run into the API lock's fatal limit.
+// The longest the dump waits for the API lock: it must never hold up the service for long, nor
+// run into the lock's fatal limit. Every other lock it takes is only ever held briefly.
 constexpr std::chrono::milliseconds kLockWait{1000};
 
 int64_t AgeMs(steady_clock::time_point then) {
