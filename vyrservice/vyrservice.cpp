@@ -413,11 +413,17 @@ void VYRService::HandleBinderDied(AIBinder* binder) {
     if (it == clients_.end()) {
         return;
     }
-    const int32_t handle = it->first;
-    ClientEntry& entry = *it->second;
+    ReleaseDeadClient(it->first, "callback");
+}
+
+void VYRService::ReleaseDeadClient(int32_t handle, const std::string& cause) {
+    ClientEntry& entry = *clients_.at(handle);
     ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry.mode);
-    RecordEvent("death of handle " + std::to_string(handle) + " (callback)");
-    AIBinder_unlinkToDeath(entry.callback_binder.get(), entry.death_recipient, nullptr);
+    RecordEvent("death of handle " + std::to_string(handle) + " (" + cause + ")");
+    if (entry.death_recipient != nullptr) {
+        // The cookie is deliberately null: every link of the recipient on the binder goes.
+        AIBinder_unlinkToDeath(entry.callback_binder.get(), entry.death_recipient, nullptr);
+    }
     DisableInternal(handle, /*client_died=*/true);
     CloseInternal(handle);
 }
@@ -434,12 +440,7 @@ void VYRService::HandleClientProcessExit(pid_t pid) {
     // of the same death cannot handle the client twice.
     for (int32_t handle : handles) {
         ALOGI("Receive binder death callback");
-        ALOGI("client %d mode %d died; disable sensor and remove client handle", handle,
-              clients_[handle]->mode);
-        RecordEvent("death of handle " + std::to_string(handle) + " (process " +
-                    std::to_string(pid) + ")");
-        DisableInternal(handle, /*client_died=*/true);
-        CloseInternal(handle);
+        ReleaseDeadClient(handle, "process " + std::to_string(pid));
     }
 }
 

@@ -87,6 +87,9 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     void SweepDeathLinks() REQUIRES(api_lock_) EXCLUDES(links_mutex_);
     // Disables and closes every client that the ended process opened, as a death notice does.
     void HandleClientProcessExit(pid_t pid) EXCLUDES(api_lock_);
+    // What a client's death does, whichever way it was learnt: the log line, then the shared
+    // internal disable and close.
+    void ReleaseDeadClient(int32_t handle, const std::string& cause) REQUIRES(api_lock_);
 
     void WorkLoop(unsigned int sensor_type);
     void EnableWork(const WorkItem& item, ServiceModeParams* params, unsigned int sensor_type);
