@@ -383,19 +383,27 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
     Waiter waiter;
     std::vector<WireObject> objects;
     uint64_t id;
+    // Taken before the call goes out, so that its reply never wakes a runtime thread.
+    bool reader = false;
     {
         std::lock_guard<std::mutex> lock(mutex_);
         if (dead_.load(std::memory_order_relaxed)) return STATUS_DEAD_OBJECT;
         binder_status_t status = EncodeObjectsLocked(in, &objects);
         if (status != STATUS_OK) return status;
         id = next_transaction_id_++;
-        if (!oneway) waiters_.emplace_back(id, &waiter);
+        if (!oneway) {
+            waiters_.emplace_back(id, &waiter);
+            reader = !reading_;
+            reading_ = true;
+        }
     }
+    if (reader) TheLooper().Disarm(*this);
     uint64_t parent = ScopedCallContext::ParentFor(this);
     if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects, descriptor)) {
         {
             std::lock_guard<std::mutex> lock(mutex_);
             RemoveWaiterLocked(id);
+            if (reader) reading_ = false;
         }
         // The peer is gone: its objects are dead from now on, not only once someone reads.
         Die();
@@ -405,23 +413,26 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
 
     UniqueLock lock(mutex_);
     while (!waiter.done) {
-        if (!waiter.nested.empty()) {
-            // The peer calls back into us while serving our call: serve it on this thread.
-            std::shared_ptr<Incoming> call = std::move(waiter.nested.front());
-            waiter.nested.erase(waiter.nested.begin());
-            lock.unlock();
-            Serve(*call);
-            call.reset();
-            lock.lock();
-            continue;
+        if (!reader) {
+            if (!waiter.nested.empty()) {
+                // The peer calls back into us while serving our call: serve it on this thread.
+                std::shared_ptr<Incoming> call = std::move(waiter.nested.front());
+                waiter.nested.erase(waiter.nested.begin());
+                lock.unlock();
+                Serve(*call);
+                call.reset();
+                lock.lock();
+                continue;
+            }
+            if (reading_ || dead_.load(std::memory_order_relaxed)) {
+                waiter.cv.wait(lock.native());
+                continue;
+            }
+            // Nobody is reading: read for ourselves, sparing a hand-over for our reply.
+            reading_ = true;
+            TheLooper().Disarm(*this);
         }
-        if (reading_ || dead_.load(std::memory_order_relaxed)) {
-            waiter.cv.wait(lock.native());
-            continue;
-        }
-        // Nobody is reading: read for ourselves, sparing a hand-over for our reply.
-        reading_ = true;
-        TheLooper().Disarm(*this);
+        reader = false;
         lock.unlock();
         std::shared_ptr<Incoming> call;
         bool alive = ReadAndHandle(true, &call);
@@ -447,6 +458,8 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             lock.lock();
         }
     }
+    // The connection died before this caller got to read.
+    if (reader) reading_ = false;
     RemoveWaiterLocked(id);
     std::vector<std::shared_ptr<Incoming>> dropped = std::move(waiter.nested);
     std::unique_ptr<AParcel> reply = std::move(waiter.reply);

@@ -1,6 +1,7 @@
 #include "frame_io.h"
 
 #include <errno.h>
+#include <poll.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
 
@@ -75,7 +76,10 @@ FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
         if (buffer_.size() - begin_ < needed && !Resize(begin_ + needed)) {
             return Result::kOverLimit;
         }
-        ssize_t n = Receive(fd, wait);
+        // A thread blocked in recvmsg on a Unix socket is also woken each time the peer reads
+        // what this side sent (write space); poll for input alone sleeps through those.
+        if (wait && !WaitReadable(fd)) return Result::kClosed;
+        ssize_t n = Receive(fd);
         if (n > 0 && descriptors_.size() > kMaxReceivedDescriptors) return Result::kMalformed;
         if (n > 0) {
             end_ += static_cast<size_t>(n);
@@ -83,12 +87,23 @@ FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
         }
         if (n == 0) return Result::kClosed;
         if (errno == EINTR) continue;
-        if (!wait && (errno == EAGAIN || errno == EWOULDBLOCK)) return Result::kNoData;
+        if (errno == EAGAIN || errno == EWOULDBLOCK) {
+            if (wait) continue;
+            return Result::kNoData;
+        }
         return Result::kClosed;
     }
 }
 
-ssize_t FrameBuffer::Receive(int fd, bool wait) {
+bool FrameBuffer::WaitReadable(int fd) {
+    pollfd readable{fd, POLLIN, 0};
+    while (poll(&readable, 1, -1) < 0) {
+        if (errno != EINTR) return false;
+    }
+    return true;
+}
+
+ssize_t FrameBuffer::Receive(int fd) {
     iovec iov{buffer_.data() + end_, buffer_.size() - end_};
     alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxReceivedDescriptors)];
     msghdr msg{};
@@ -96,7 +111,7 @@ ssize_t FrameBuffer::Receive(int fd, bool wait) {
     msg.msg_iovlen = 1;
     msg.msg_control = control;
     msg.msg_controllen = sizeof(control);
-    const ssize_t n = recvmsg(fd, &msg, MSG_CMSG_CLOEXEC | (wait ? 0 : MSG_DONTWAIT));
+    const ssize_t n = recvmsg(fd, &msg, MSG_CMSG_CLOEXEC | MSG_DONTWAIT);
     if (n < 0) return n;
     for (cmsghdr* c = CMSG_FIRSTHDR(&msg); c != nullptr; c = CMSG_NXTHDR(&msg, c)) {
         if (c->cmsg_level != SOL_SOCKET || c->cmsg_type != SCM_RIGHTS) continue;

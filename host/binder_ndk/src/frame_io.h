@@ -55,8 +55,11 @@ class FrameBuffer {
     // Resizes the buffer within the process-wide budget; false if that would exceed it.
     bool Resize(size_t size);
 
-    // Reads what the socket has into the buffer, keeping the descriptors that come with it.
-    ssize_t Receive(int fd, bool wait);
+    // Reads what the socket has into the buffer without waiting, keeping the descriptors that
+    // come with it.
+    ssize_t Receive(int fd);
+    // Until the socket has input or has ended; false on a poll error.
+    static bool WaitReadable(int fd);
 
     std::vector<uint8_t> buffer_;
     // In the order they arrived, which is the order of the frames that announced them.
