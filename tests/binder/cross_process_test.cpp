@@ -8,6 +8,7 @@
 #include <spawn.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -17,6 +18,7 @@
 #include <chrono>
 #include <condition_variable>
 #include <cstring>
+#include <map>
 #include <mutex>
 #include <string>
 #include <thread>
@@ -27,6 +29,7 @@
 #include "frame_io.h"
 #include "raw_peer.h"
 #include "test_service.h"
+#include "thread_count.h"
 #include "wire.h"
 
 extern char** environ;
@@ -170,6 +173,24 @@ TEST_F(CrossProcessTest, CallsReachTheOtherProcess) {
     EXPECT_EQ(EX_SERVICE_SPECIFIC, error.getExceptionCode());
     EXPECT_EQ(-3, error.getServiceSpecificError());
     EXPECT_STREQ("neg", error.getMessage());
+}
+
+// The caller reads its own reply: no other thread of the process wakes for a call.
+TEST_F(CrossProcessTest, RepliesWakeNoThreadButTheirCaller) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    int32_t result = 0;
+    ASSERT_TRUE(service->Enable(1, 2, &result).isOk());
+    const pid_t caller = static_cast<pid_t>(syscall(SYS_gettid));
+    std::map<pid_t, unsigned long> before = vyr_test::VoluntarySwitches();
+    for (int i = 0; i < 200; ++i) {
+        ASSERT_TRUE(service->Enable(i, 2, &result).isOk());
+        ASSERT_EQ(i + 2, result);
+    }
+    for (const auto& [tid, switches] : vyr_test::VoluntarySwitches()) {
+        if (tid == caller || before.count(tid) == 0) continue;
+        EXPECT_EQ(before[tid], switches) << "thread " << tid << " woke during the calls";
+    }
 }
 
 TEST_F(CrossProcessTest, CallingIdentityComesFromThePeer) {

@@ -2,14 +2,18 @@
 
 #include <gtest/gtest.h>
 #include <sys/socket.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 
+#include <atomic>
+#include <chrono>
 #include <cstring>
 #include <memory>
 #include <thread>
 #include <vector>
 
 #include "frame_io.h"
+#include "thread_count.h"
 #include "wire.h"
 
 namespace {
@@ -26,6 +30,7 @@ class SocketPair {
         close(fds_[1]);
     }
     int reader() const { return fds_[0]; }
+    int writer() const { return fds_[1]; }
     void HangUp() { shutdown(fds_[1], SHUT_WR); }
     // Lets a writer blocked on a full socket fail instead of waiting.
     void CloseReader() { shutdown(fds_[0], SHUT_RDWR); }
@@ -42,6 +47,13 @@ class SocketPair {
   private:
     int fds_[2] = {-1, -1};
 };
+
+FrameHeader SmallFrameHeader() {
+    FrameHeader header{};
+    header.magic = vyr_binder::kFrameMagic;
+    header.type = static_cast<uint32_t>(vyr_binder::FrameType::kReply);
+    return header;
+}
 
 FrameHeader LargeFrameHeader() {
     FrameHeader header{};
@@ -72,6 +84,38 @@ TEST(FrameBufferTest, AHeaderAloneDoesNotSizeTheBuffer) {
         EXPECT_EQ(frame.data, data);
     }
     EXPECT_EQ(BufferedBytes(), before) << "a buffer gives its room back when it goes";
+}
+
+// A caller waiting for its reply is not woken when the peer reads the call it sent, only when
+// the reply comes.
+TEST(FrameBufferTest, AWaitingReadSleepsThroughThePeerTakingWhatItSent) {
+    SocketPair pair;
+    std::atomic<pid_t> waiter_tid{0};
+    unsigned long sleeps = 0;
+    FrameBuffer::Result result = FrameBuffer::Result::kMalformed;
+    std::thread waiter([&] {
+        const std::vector<uint8_t> call(4096, 3);
+        ASSERT_EQ(static_cast<ssize_t>(call.size()),
+                  send(pair.reader(), call.data(), call.size(), 0));
+        const pid_t tid = static_cast<pid_t>(syscall(SYS_gettid));
+        const unsigned long before = vyr_test::VoluntarySwitches()[tid];
+        waiter_tid = tid;
+        FrameBuffer buffer;
+        result = buffer.Fill(pair.reader(), true);
+        sleeps = vyr_test::VoluntarySwitches()[tid] - before;
+    });
+    while (waiter_tid.load() == 0) std::this_thread::yield();
+    ASSERT_TRUE(vyr_test::WaitUntilAsleep(waiter_tid, std::chrono::seconds(10)));
+    // The peer takes the call: the socket has room again, which wakes a plain blocking read.
+    std::vector<uint8_t> call(4096);
+    ASSERT_EQ(static_cast<ssize_t>(call.size()),
+              recv(pair.writer(), call.data(), call.size(), MSG_WAITALL));
+    ASSERT_TRUE(vyr_test::WaitUntilAsleep(waiter_tid, std::chrono::seconds(10)));
+    const FrameHeader reply = SmallFrameHeader();
+    pair.Write(&reply, sizeof(reply));
+    waiter.join();
+    EXPECT_EQ(FrameBuffer::Result::kFrame, result);
+    EXPECT_EQ(1u, sleeps) << "the waiting thread went to sleep more than once for one reply";
 }
 
 TEST(FrameBufferTest, BuffersOfAllConnectionsStayUnderTheProcessLimit) {

@@ -2,6 +2,7 @@
 
 #include <dirent.h>
 
+#include <cstdio>
 #include <fstream>
 #include <sstream>
 #include <thread>
@@ -14,16 +15,21 @@ constexpr unsigned long kExiting = 0x4;
 
 // A joined thread wakes its joiner before the kernel has removed its task; such a task is past
 // the point of return and is not counted.
-bool Exiting(const std::string& tid) {
+// The fields of a task's stat line after its name; empty when the task is gone.
+std::string StatFields(const std::string& tid) {
     std::ifstream stat("/proc/self/task/" + tid + "/stat");
     std::string line;
-    if (!std::getline(stat, line)) return true;
-    std::istringstream fields(line.substr(line.rfind(')') + 1));
+    if (!std::getline(stat, line)) return "";
+    return line.substr(line.rfind(')') + 1);
+}
+
+bool Exiting(const std::string& tid) {
+    std::istringstream fields(StatFields(tid));
     std::string skipped;
     for (int i = 0; i < 6; ++i) fields >> skipped;  // state, ppid, pgrp, session, tty, tpgid
     unsigned long flags = 0;
     fields >> flags;
-    return (flags & kExiting) != 0;
+    return !fields || (flags & kExiting) != 0;
 }
 
 template <typename Visit>
@@ -62,6 +68,33 @@ bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
         std::this_thread::sleep_for(std::chrono::milliseconds(2));
     }
     return true;
+}
+
+std::map<pid_t, unsigned long> VoluntarySwitches() {
+    std::map<pid_t, unsigned long> switches;
+    ForEachLiveThread([&switches](const std::string& tid) {
+        std::ifstream status("/proc/self/task/" + tid + "/status");
+        std::string line;
+        while (std::getline(status, line)) {
+            unsigned long count = 0;
+            if (sscanf(line.c_str(), "voluntary_ctxt_switches: %lu", &count) == 1) {
+                switches[std::stoi(tid)] = count;
+            }
+        }
+    });
+    return switches;
+}
+
+bool WaitUntilAsleep(pid_t tid, std::chrono::milliseconds timeout) {
+    const auto deadline = std::chrono::steady_clock::now() + timeout;
+    while (true) {
+        std::istringstream fields(StatFields(std::to_string(tid)));
+        std::string state;
+        fields >> state;
+        if (state == "S") return true;
+        if (std::chrono::steady_clock::now() >= deadline) return false;
+        std::this_thread::yield();
+    }
 }
 
 }  // namespace vyr_test

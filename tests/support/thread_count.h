@@ -2,8 +2,11 @@
 
 // Thread counting through /proc, for tests that check that nothing leaves a thread behind.
 
+#include <sys/types.h>
+
 #include <chrono>
 #include <cstddef>
+#include <map>
 #include <string>
 
 namespace vyr_test {
@@ -14,5 +17,9 @@ size_t ThreadCount();
 std::string ThreadNames();
 // Waits until the process has `count` threads; false on time-out.
 bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout);
+// How often each live thread of this process has gone to sleep so far, by thread id.
+std::map<pid_t, unsigned long> VoluntarySwitches();
+// Waits until thread `tid` of this process sleeps (state S); false on time-out.
+bool WaitUntilAsleep(pid_t tid, std::chrono::milliseconds timeout);
 
 }  // namespace vyr_test
