@@ -1,0 +1,178 @@
+// The floor of the service's CPU per delivered event: the same pattern of wake-ups with nothing
+// else in it. One thread publishes a sample at the sensor's frame rate; each of N client threads
+// wakes once per client period on a timed condition-variable wait and, when a sample is new to
+// it, sends an event's bytes to an echo process of its own and waits for the reply's bytes.
+//
+//   bench_event_floor [--clients N] [--period-ms P] [--frame-hz F] [--seconds S]
+//
+// Prints the process's CPU time per event delivered.
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+namespace {
+
+// A range event's frame and the reply to it, as the service sends and receives them.
+constexpr size_t kEventBytes = 340;
+constexpr size_t kReplyBytes = 60;
+
+struct Options {
+    int clients = 10;
+    int period_ms = 10;
+    int frame_hz = 30;
+    double seconds = 10;
+};
+
+std::atomic<bool> g_stop{false};
+std::atomic<long> g_events{0};
+
+std::mutex g_sample_mutex;
+long g_sample = 0;
+
+bool ReadFull(int fd, char* buffer, size_t size) {
+    size_t done = 0;
+    while (done < size) {
+        ssize_t n = read(fd, buffer + done, size - done);
+        if (n <= 0) return false;
+        done += static_cast<size_t>(n);
+    }
+    return true;
+}
+
+void Echo(int fd) {
+    char event[kEventBytes];
+    char reply[kReplyBytes] = {1};
+    while (ReadFull(fd, event, sizeof(event))) {
+        if (write(fd, reply, sizeof(reply)) != static_cast<ssize_t>(sizeof(reply))) break;
+    }
+    _exit(0);
+}
+
+void TimedWait(std::chrono::milliseconds period) {
+    std::mutex mutex;
+    std::condition_variable cv;
+    const auto deadline = std::chrono::steady_clock::now() + period;
+    std::unique_lock<std::mutex> lock(mutex);
+    while (std::chrono::steady_clock::now() < deadline) cv.wait_until(lock, deadline);
+}
+
+void Sensor(const Options& options) {
+    const auto period = std::chrono::nanoseconds(1000000000LL / options.frame_hz);
+    auto next = std::chrono::steady_clock::now() + period;
+    std::mutex mutex;
+    std::condition_variable cv;
+    while (!g_stop.load(std::memory_order_relaxed)) {
+        {
+            std::unique_lock<std::mutex> lock(mutex);
+            while (std::chrono::steady_clock::now() < next) cv.wait_until(lock, next);
+        }
+        next += period;
+        std::lock_guard<std::mutex> lock(g_sample_mutex);
+        ++g_sample;
+    }
+}
+
+void Client(const Options& options, int fd, int index) {
+    // Clients that start at different times wake at different times.
+    std::this_thread::sleep_for(std::chrono::microseconds(1000LL * options.period_ms * index /
+                                                          options.clients));
+    char event[kEventBytes] = {2};
+    char reply[kReplyBytes];
+    long taken = 0;
+    while (!g_stop.load(std::memory_order_relaxed)) {
+        long sample;
+        {
+            std::lock_guard<std::mutex> lock(g_sample_mutex);
+            sample = g_sample;
+        }
+        if (sample != taken) {
+            taken = sample;
+            if (write(fd, event, sizeof(event)) != static_cast<ssize_t>(sizeof(event))) return;
+            // Waiting as the runtime does: poll, then read.
+            pollfd readable{fd, POLLIN, 0};
+            poll(&readable, 1, -1);
+            if (!ReadFull(fd, reply, sizeof(reply))) return;
+            g_events.fetch_add(1, std::memory_order_relaxed);
+        }
+        TimedWait(std::chrono::milliseconds(options.period_ms));
+    }
+}
+
+double CpuSeconds() {
+    timespec now{};
+    clock_gettime(CLOCK_PROCESS_CPUTIME_ID, &now);
+    return static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec) / 1e9;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    Options options;
+    for (int i = 1; i + 1 < argc; i += 2) {
+        if (strcmp(argv[i], "--clients") == 0) {
+            options.clients = atoi(argv[i + 1]);
+        } else if (strcmp(argv[i], "--period-ms") == 0) {
+            options.period_ms = atoi(argv[i + 1]);
+        } else if (strcmp(argv[i], "--frame-hz") == 0) {
+            options.frame_hz = atoi(argv[i + 1]);
+        } else if (strcmp(argv[i], "--seconds") == 0) {
+            options.seconds = atof(argv[i + 1]);
+        } else {
+            fprintf(stderr, "unknown option %s\n", argv[i]);
+            return 2;
+        }
+    }
+    if (options.clients < 1 || options.period_ms < 1 || options.frame_hz < 1 ||
+        options.seconds <= 0) {
+        fprintf(stderr, "usage: bench_event_floor [--clients N] [--period-ms P] [--frame-hz F] "
+                        "[--seconds S]\n");
+        return 2;
+    }
+    std::vector<int> fds;
+    for (int i = 0; i < options.clients; ++i) {
+        int pair[2];
+        if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, pair) != 0) return 1;
+        if (fork() == 0) {
+            close(pair[0]);
+            Echo(pair[1]);
+        }
+        close(pair[1]);
+        fds.push_back(pair[0]);
+    }
+    std::vector<std::thread> threads;
+    threads.emplace_back(Sensor, std::cref(options));
+    for (int i = 0; i < options.clients; ++i) {
+        threads.emplace_back(Client, std::cref(options), fds[i], i);
+    }
+
+    // As bench/run does for the service: let the clients settle first.
+    std::this_thread::sleep_for(std::chrono::milliseconds(1500));
+    const double cpu0 = CpuSeconds();
+    const long events0 = g_events.load();
+    std::this_thread::sleep_for(std::chrono::duration<double>(options.seconds));
+    const double cpu = CpuSeconds() - cpu0;
+    const long events = g_events.load() - events0;
+    g_stop = true;
+    for (std::thread& thread : threads) thread.join();
+    for (int fd : fds) close(fd);
+    while (wait(nullptr) > 0) {
+    }
+    if (events == 0) {
+        printf("no events\n");
+        return 1;
+    }
+    printf("%.0f us (%ld events)\n", cpu * 1e6 / static_cast<double>(events), events);
+    return 0;
+}
