@@ -86,8 +86,8 @@ void Sensor(const Options& options) {
 
 void Client(const Options& options, int fd, int index) {
     // Clients that start at different times wake at different times.
-    std::this_thread::sleep_for(std::chrono::microseconds(1000LL * options.period_ms * index /
-                                                          options.clients));
+    std::this_thread::sleep_for(
+        std::chrono::microseconds(1000LL * options.period_ms * index / options.clients));
     char event[kEventBytes] = {2};
     char reply[kReplyBytes];
     long taken = 0;
@@ -136,8 +136,9 @@ int main(int argc, char** argv) {
     }
     if (options.clients < 1 || options.period_ms < 1 || options.frame_hz < 1 ||
         options.seconds <= 0) {
-        fprintf(stderr, "usage: bench_event_floor [--clients N] [--period-ms P] [--frame-hz F] "
-                        "[--seconds S]\n");
+        fprintf(stderr,
+                "usage: bench_event_floor [--clients N] [--period-ms P] [--frame-hz F] "
+                "[--seconds S]\n");
         return 2;
     }
     std::vector<int> fds;
