@@ -65,9 +65,38 @@ void Connection::Close() {
     shutdown(fd_, SHUT_RDWR);
 }
 
+void Connection::Watch(bool input) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    watch_input_ = watch_input_ || input;
+    if (!reading_ && !dead_.load(std::memory_order_relaxed)) ArmLocked(WantedLocked());
+}
+
+void Connection::WatchInput() {
+    std::lock_guard<std::mutex> lock(mutex_);
+    WatchInputLocked();
+}
+
+void Connection::WatchInputLocked() {
+    watch_input_ = true;
+    // Whoever reads re-arms when done; nobody reads while the event waits to be handled.
+    if (!reading_ && armed_ == Armed::kHangUp && !dead_.load(std::memory_order_relaxed)) {
+        ArmLocked(Armed::kInput);
+    }
+}
+
+void Connection::ArmLocked(Armed armed) {
+    if (armed == Armed::kNone) {
+        TheLooper().Disarm(*this);
+    } else {
+        TheLooper().Arm(*this, armed == Armed::kInput);
+    }
+    armed_ = armed;
+}
+
 void Connection::OnReadable(bool can_serve) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
+        armed_ = Armed::kNone;
         // Whoever holds the role re-arms the looper when done.
         if (reading_ || dead_.load(std::memory_order_relaxed)) return;
         reading_ = true;
@@ -77,7 +106,7 @@ void Connection::OnReadable(bool can_serve) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
         reading_ = false;
-        if (alive && !dead_.load(std::memory_order_relaxed)) TheLooper().Arm(*this);
+        if (alive && !dead_.load(std::memory_order_relaxed)) ArmLocked(WantedLocked());
     }
     if (!alive) {
         Die();
@@ -245,6 +274,8 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
         }
         LocalBinder* local = static_cast<LocalBinder*>(binder);
         uint64_t id = local->ExportId();
+        // The peer learns of the object from this frame and may call it from then on.
+        if (!watch_input_) WatchInputLocked();
         Export& entry = exports_[id];
         if (entry.binder.get() == nullptr) entry.binder = object.binder;
         ++entry.count;
@@ -395,9 +426,9 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             waiters_.emplace_back(id, &waiter);
             reader = !reading_;
             reading_ = true;
+            if (reader && armed_ == Armed::kInput) ArmLocked(Armed::kNone);
         }
     }
-    if (reader) TheLooper().Disarm(*this);
     uint64_t parent = ScopedCallContext::ParentFor(this);
     if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects, descriptor)) {
         {
@@ -430,7 +461,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             }
             // Nobody is reading: read for ourselves, sparing a hand-over for our reply.
             reading_ = true;
-            TheLooper().Disarm(*this);
+            if (armed_ == Armed::kInput) ArmLocked(Armed::kNone);
         }
         reader = false;
         lock.unlock();
@@ -444,7 +475,9 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             lock.lock();
             continue;
         }
-        if (!dead_.load(std::memory_order_relaxed)) TheLooper().Arm(*this);
+        if (!dead_.load(std::memory_order_relaxed) && armed_ != WantedLocked()) {
+            ArmLocked(WantedLocked());
+        }
         // Another caller may be asleep waiting for the role.
         for (auto& entry : waiters_) {
             if (entry.second != &waiter && !entry.second->done) {

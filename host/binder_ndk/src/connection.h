@@ -39,6 +39,11 @@ class Connection : public std::enable_shared_from_this<Connection> {
 
     // Introduces this process; the connection must already be in the looper.
     void Start(const std::string& own_key);
+    // Arms the connection in the looper once it is there: for any input when `input` (the peer
+    // may call this process), otherwise only for the peer's hang-up.
+    void Watch(bool input);
+    // From now on the peer may call this process: its input is watched too.
+    void WatchInput();
     // The looper saw data: read one frame, then serve a call in it here (can_serve) or queue it.
     void OnReadable(bool can_serve);
 
@@ -93,6 +98,15 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void HandleRelease(uint64_t id, uint32_t count);
     void Dispatch(std::shared_ptr<Incoming> call, bool can_serve);
     void ServeContextCall(Incoming& call);
+    // What the connection is armed for in the looper. A peer that holds nothing of this process
+    // can only answer calls (the callers read those answers themselves) or hang up, so only its
+    // hang-up is watched: a call then costs no re-arming.
+    enum class Armed { kNone, kHangUp, kInput };
+    Armed WantedLocked() const REQUIRES(mutex_) {
+        return watch_input_ ? Armed::kInput : Armed::kHangUp;
+    }
+    void ArmLocked(Armed armed) REQUIRES(mutex_);
+    void WatchInputLocked() REQUIRES(mutex_);
     void Serve(Incoming& call);
     binder_status_t ServeDump(Incoming& call);
     void Die();
@@ -144,6 +158,9 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::unordered_map<uint64_t, ProxyBinder*> proxies_ GUARDED_BY(mutex_);
     bool hello_seen_ GUARDED_BY(mutex_) = false;
     bool reading_ GUARDED_BY(mutex_) = false;  // the reading role is taken
+    bool watch_input_ GUARDED_BY(mutex_) = false;
+    // Kept by whoever arms; a fired event leaves the connection disarmed until it is read.
+    Armed armed_ GUARDED_BY(mutex_) = Armed::kNone;
     FrameBuffer buffer_;                       // used by the holder of the reading role only
 };
 

@@ -190,7 +190,7 @@ void Looper::Add(const std::shared_ptr<Connection>& connection) {
         looper_running_ = true;
         SpawnLocked(Kind::kLooper);
     }
-    Control(EPOLL_CTL_ADD, connection->fd(), EPOLLIN | EPOLLRDHUP | EPOLLONESHOT, serial);
+    Control(EPOLL_CTL_ADD, connection->fd(), EPOLLONESHOT, serial);
 }
 
 void Looper::Remove(const Connection& connection) {
@@ -205,9 +205,9 @@ void Looper::Remove(const Connection& connection) {
     // `removed` may hold the last reference; it is released after the lock.
 }
 
-void Looper::Arm(const Connection& connection) {
-    Control(EPOLL_CTL_MOD, connection.fd(), EPOLLIN | EPOLLRDHUP | EPOLLONESHOT,
-            connection.serial());
+void Looper::Arm(const Connection& connection, bool input) {
+    const uint32_t events = (input ? uint32_t{EPOLLIN} : 0u) | EPOLLRDHUP | EPOLLONESHOT;
+    Control(EPOLL_CTL_MOD, connection.fd(), events, connection.serial());
 }
 
 void Looper::Disarm(const Connection& connection) {

@@ -48,10 +48,12 @@ class Looper {
     // Runs `task` on a runtime thread now, pool or not (death notices).
     void RunTask(std::function<void()> task);
 
+    // Adds the connection disarmed; the connection arms itself.
     void Add(const std::shared_ptr<Connection>& connection);
     void Remove(const Connection& connection);
-    // Lets one waiting thread read the connection when data arrives; Disarm stops that.
-    void Arm(const Connection& connection);
+    // Lets one waiting thread read the connection when data arrives (`input`) or only when the
+    // peer hangs up; Disarm stops both. Each wakes one thread once, then it is disarmed again.
+    void Arm(const Connection& connection, bool input);
     void Disarm(const Connection& connection);
     std::vector<std::shared_ptr<Connection>> Connections();
     void WaitForNoConnections();

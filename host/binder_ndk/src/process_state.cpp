@@ -47,6 +47,11 @@ binder_exception_t ProcessState::Publish(const std::string& name, const ndk::SpA
         std::lock_guard<std::mutex> lock(mutex_);
         if (shutting_down_ || !EnsureListenerLocked(dir)) return EX_ILLEGAL_STATE;
     }
+    // Before the name is seen: peers connected already may look it up over their connection.
+    may_be_called_.store(true);
+    for (const std::shared_ptr<Connection>& connection : looper_.Connections()) {
+        connection->WatchInput();
+    }
     // Known locally first, so a peer that sees the name can already look it up.
     ndk::SpAIBinder previous;
     {
@@ -147,6 +152,7 @@ std::shared_ptr<Connection> ProcessState::ConnectTo(const std::string& dir,
     }
     connection->Start(own_key);
     looper_.Add(connection);
+    connection->Watch(may_be_called_.load());
     return connection;
 }
 
@@ -158,6 +164,8 @@ void ProcessState::Adopt(const std::shared_ptr<Connection>& connection) {
     }
     connection->Start(own_key);
     looper_.Add(connection);
+    // The peer connected to call this process.
+    connection->Watch(true);
 }
 
 void ProcessState::NamePeer(const std::shared_ptr<Connection>& connection,
@@ -200,6 +208,7 @@ void ProcessState::Shutdown() {
         services.swap(services_);
     }
     services.clear();
+    may_be_called_.store(false);
     std::lock_guard<std::mutex> lock(mutex_);
     by_key_.clear();
     key_.clear();

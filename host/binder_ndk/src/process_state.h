@@ -4,6 +4,7 @@
 #include <android/binder_auto_utils.h>
 #include <android/binder_status.h>
 
+#include <atomic>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -58,6 +59,8 @@ class ProcessState {
     std::map<std::string, std::unique_ptr<Listener>> listeners_ GUARDED_BY(mutex_);
     // (directory, name)
     std::vector<std::pair<std::string, std::string>> published_ GUARDED_BY(mutex_);
+    // Once this process publishes a name, any peer may call it, over any connection.
+    std::atomic<bool> may_be_called_{false};
 };
 
 }  // namespace vyr_binder
