@@ -176,21 +176,67 @@ TEST_F(CrossProcessTest, CallsReachTheOtherProcess) {
 }
 
 // The caller reads its own reply: no other thread of the process wakes for a call.
-TEST_F(CrossProcessTest, RepliesWakeNoThreadButTheirCaller) {
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
-    ASSERT_NE(nullptr, service);
+void ExpectCallsWakeOnlyTheCaller(IVYRService& service) {
     int32_t result = 0;
-    ASSERT_TRUE(service->Enable(1, 2, &result).isOk());
+    ASSERT_TRUE(service.Enable(1, 2, &result).isOk());
     const pid_t caller = static_cast<pid_t>(syscall(SYS_gettid));
     std::map<pid_t, unsigned long> before = vyr_test::VoluntarySwitches();
     for (int i = 0; i < 200; ++i) {
-        ASSERT_TRUE(service->Enable(i, 2, &result).isOk());
+        ASSERT_TRUE(service.Enable(i, 2, &result).isOk());
         ASSERT_EQ(i + 2, result);
     }
     for (const auto& [tid, switches] : vyr_test::VoluntarySwitches()) {
         if (tid == caller || before.count(tid) == 0) continue;
         EXPECT_EQ(before[tid], switches) << "thread " << tid << " woke during the calls";
     }
+}
+
+TEST_F(CrossProcessTest, RepliesWakeNoThreadButTheirCaller) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    ExpectCallsWakeOnlyTheCaller(*service);
+}
+
+TEST_F(CrossProcessTest, RepliesWakeNoThreadButTheirCallerAlsoWhenTheProcessMayBeCalled) {
+    auto local = ndk::SharedRefBase::make<TestService>();
+    ASSERT_EQ(EX_NONE, AServiceManager_addService(local->asBinder().get(), "vyr.local"));
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    ExpectCallsWakeOnlyTheCaller(*service);
+}
+
+// A peer that held nothing of this process is watched only for its hang-up; once a name is
+// published here, it can call over the connection it already has, while nobody here calls.
+TEST_F(CrossProcessTest, ANamePublishedLaterIsReachedOverAnExistingConnection) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    int32_t result = 0;
+    ASSERT_TRUE(service->Enable(1, 2, &result).isOk());
+    auto callee = ndk::SharedRefBase::make<TestService>();
+    ASSERT_EQ(EX_NONE,
+              AServiceManager_addService(callee->asBinder().get(), TestService::kCalleeName));
+    ASSERT_TRUE(service->Open(TestService::kTorchCalleeLater, &result).isOk());
+    EXPECT_TRUE(Eventually([&] {
+        int32_t torch = 0;
+        callee->Open(TestService::kQueryTorch, &torch);
+        return torch == TestService::kCalleeTorch;
+    })) << "the peer's call over the existing connection was never served";
+}
+
+// Watched only for its hang-up, a peer that holds nothing of this process still reports its
+// death.
+TEST_F(CrossProcessTest, APeerThatHoldsNothingOfOursReportsItsDeath) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, service);
+    int32_t result = 0;
+    ASSERT_TRUE(service->Enable(1, 2, &result).isOk());
+    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    int cookie = 0;
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(service->asBinder().get(), recipient.get(), &cookie));
+    Kill(pid);
+    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
+    EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookie));
 }
 
 TEST_F(CrossProcessTest, CallingIdentityComesFromThePeer) {

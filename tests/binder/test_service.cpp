@@ -1,6 +1,7 @@
 #include "test_service.h"
 
 #include <android/binder_ibinder.h>
+#include <android/binder_manager.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -14,6 +15,18 @@ TestService::~TestService() {
 }
 
 ndk::ScopedAStatus TestService::Open(int32_t mode, int32_t* result) {
+    if (mode == kTorchCalleeLater) {
+        std::lock_guard<std::mutex> lock(mutex_);
+        // Late enough that the caller has read this reply and reads nothing any more.
+        senders_.emplace_back([] {
+            std::this_thread::sleep_for(std::chrono::milliseconds(100));
+            std::shared_ptr<IVYRService> callee =
+                IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_checkService(kCalleeName)));
+            if (callee != nullptr) callee->SetTorchLightState(kCalleeTorch);
+        });
+        *result = 0;
+        return ndk::ScopedAStatus::ok();
+    }
     *result = mode == kQueryTorch ? torch_state_.load() : mode * 10;
     return ndk::ScopedAStatus::ok();
 }

@@ -15,15 +15,21 @@ using aidl::android::vyr::BnEventCallback;
 using aidl::android::vyr::BnVYRService;
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
+using aidl::android::vyr::IVYRService;
 
 // A small IVYRService whose results tell what it received, for round trips through the runtime.
-// Open(kQueryTorch) returns the last torch state; Close(n > 0) delivers n events to the stored
+// Open(kQueryTorch) returns the last torch state; Open(kTorchCalleeLater) returns at once and
+// 100 ms later looks up kCalleeName and sets its torch state to kCalleeTorch; Close(n > 0)
+// delivers n events to the stored
 // callback from another thread; EnableLowPower(kBlockForever, ...) never returns. Its dump writes
 // "dump:" and its arguments on one line; with the argument "big", 4 MiB after that, and with
 // "slow", a line every 10 ms for 10 s.
 class TestService : public BnVYRService {
   public:
     static constexpr int32_t kQueryTorch = -100;
+    static constexpr int32_t kTorchCalleeLater = -101;
+    static constexpr const char* kCalleeName = "vyr.callee";
+    static constexpr int32_t kCalleeTorch = 7;
     static constexpr int32_t kBlockForever = 999;
 
     ~TestService() override;
