@@ -78,7 +78,7 @@ void Connection::WatchInput() {
 
 void Connection::WatchInputLocked() {
     watch_input_ = true;
-    // Whoever reads re-arms when done; nobody reads while the event waits to be handled.
+    // Whoever reads re-arms when done.
     if (!reading_ && armed_ == Armed::kHangUp && !dead_.load(std::memory_order_relaxed)) {
         ArmLocked(Armed::kInput);
     }
@@ -96,17 +96,28 @@ void Connection::ArmLocked(Armed armed) {
 void Connection::OnReadable(bool can_serve) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
-        armed_ = Armed::kNone;
-        // Whoever holds the role re-arms the looper when done.
-        if (reading_ || dead_.load(std::memory_order_relaxed)) return;
+        // Whoever holds the role reads on for what woke this thread.
+        if (reading_ || dead_.load(std::memory_order_relaxed)) {
+            more_ = true;
+            return;
+        }
         reading_ = true;
+        more_ = false;
     }
     std::shared_ptr<Incoming> call;
-    bool alive = ReadAndHandle(false, &call);
-    {
+    bool alive;
+    while (true) {
+        alive = ReadAndHandle(false, &call);
         std::lock_guard<std::mutex> lock(mutex_);
+        if (alive && more_ && !dead_.load(std::memory_order_relaxed)) {
+            more_ = false;
+            continue;
+        }
         reading_ = false;
-        if (alive && !dead_.load(std::memory_order_relaxed)) ArmLocked(WantedLocked());
+        if (alive && !dead_.load(std::memory_order_relaxed) && armed_ != WantedLocked()) {
+            ArmLocked(WantedLocked());
+        }
+        break;
     }
     if (!alive) {
         Die();
@@ -116,29 +127,34 @@ void Connection::OnReadable(bool can_serve) {
 }
 
 bool Connection::ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call) {
-    FrameBuffer::Result result = buffer_.Fill(fd_, wait);
-    if (result == FrameBuffer::Result::kNoData) return true;
-    if (result == FrameBuffer::Result::kOverLimit) {
-        fprintf(stderr, "binder: dropping peer %d: receive buffers over %zu bytes in all\n",
-                peer_pid_, kMaxBufferedBytesPerProcess);
-        return false;
-    }
-    while (result == FrameBuffer::Result::kFrame) {
-        Frame frame;
-        buffer_.Take(&frame);
-        std::shared_ptr<Incoming> next;
-        if (!HandleFrame(frame, &next)) return false;
-        if (next != nullptr) {
-            // One call is served by the reader itself; any other that came with it is queued.
-            if (*call == nullptr) {
-                *call = std::move(next);
-            } else {
-                Dispatch(std::move(next), false);
-            }
+    while (true) {
+        FrameBuffer::Result result = buffer_.Fill(fd_, wait);
+        if (result == FrameBuffer::Result::kOverLimit) {
+            fprintf(stderr, "binder: dropping peer %d: receive buffers over %zu bytes in all\n",
+                    peer_pid_, kMaxBufferedBytesPerProcess);
+            return false;
         }
-        result = buffer_.Check();
+        while (result == FrameBuffer::Result::kFrame) {
+            Frame frame;
+            buffer_.Take(&frame);
+            std::shared_ptr<Incoming> next;
+            if (!HandleFrame(frame, &next)) return false;
+            if (next != nullptr) {
+                // One call is served by the reader itself; any other that came with it is
+                // queued.
+                if (*call == nullptr) {
+                    *call = std::move(next);
+                } else {
+                    Dispatch(std::move(next), false);
+                }
+            }
+            result = buffer_.Check();
+        }
+        if (result != FrameBuffer::Result::kNoData) return false;
+        // A caller has what it waited for; the looper reads on until nothing is left, as what
+        // is already there will not wake it again.
+        if (wait || buffer_.drained()) return true;
     }
-    return result == FrameBuffer::Result::kNoData;
 }
 
 bool Connection::HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call) {
@@ -475,9 +491,12 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             lock.lock();
             continue;
         }
-        if (!dead_.load(std::memory_order_relaxed) && armed_ != WantedLocked()) {
+        // Arming again also wakes a thread for what came meanwhile, or for a hang-up whose
+        // wake-up found the role taken.
+        if (!dead_.load(std::memory_order_relaxed) && (more_ || armed_ != WantedLocked())) {
             ArmLocked(WantedLocked());
         }
+        more_ = false;
         // Another caller may be asleep waiting for the role.
         for (auto& entry : waiters_) {
             if (entry.second != &waiter && !entry.second->done) {

@@ -88,8 +88,9 @@ class Connection : public std::enable_shared_from_this<Connection> {
         uint64_t count = 0;
     };
 
-    // Takes the next frame off the socket and handles it in stream order; a call to run is left
-    // in `call`. False when the connection is finished.
+    // Takes frames off the socket and handles them in stream order: with `wait` until at least
+    // one came, otherwise all there are. A call to run is left in `call`. False when the
+    // connection is finished.
     bool ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call);
     // False when the peer broke the protocol.
     bool HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call);
@@ -159,9 +160,10 @@ class Connection : public std::enable_shared_from_this<Connection> {
     bool hello_seen_ GUARDED_BY(mutex_) = false;
     bool reading_ GUARDED_BY(mutex_) = false;  // the reading role is taken
     bool watch_input_ GUARDED_BY(mutex_) = false;
-    // Kept by whoever arms; a fired event leaves the connection disarmed until it is read.
     Armed armed_ GUARDED_BY(mutex_) = Armed::kNone;
-    FrameBuffer buffer_;                       // used by the holder of the reading role only
+    // Data or a hang-up woke a thread while the role was taken: its holder reads on.
+    bool more_ GUARDED_BY(mutex_) = false;
+    FrameBuffer buffer_;  // used by the holder of the reading role only
 };
 
 }  // namespace vyr_binder

@@ -79,15 +79,20 @@ FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
         // A thread blocked in recvmsg on a Unix socket is also woken each time the peer reads
         // what this side sent (write space); poll for input alone sleeps through those.
         if (wait && !WaitReadable(fd)) return Result::kClosed;
+        const size_t room = buffer_.size() - end_;
+        const size_t descriptors = descriptors_.size();
         ssize_t n = Receive(fd);
         if (n > 0 && descriptors_.size() > kMaxReceivedDescriptors) return Result::kMalformed;
         if (n > 0) {
             end_ += static_cast<size_t>(n);
+            // A read stops early at bytes that brought descriptors, with more behind them.
+            drained_ = static_cast<size_t>(n) < room && descriptors_.size() == descriptors;
             continue;
         }
         if (n == 0) return Result::kClosed;
         if (errno == EINTR) continue;
         if (errno == EAGAIN || errno == EWOULDBLOCK) {
+            drained_ = true;
             if (wait) continue;
             return Result::kNoData;
         }

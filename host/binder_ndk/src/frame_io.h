@@ -49,6 +49,9 @@ class FrameBuffer {
     Result Check() const;
     // Moves the buffered frame out; Check must have given kFrame.
     void Take(Frame* frame);
+    // Whether the last read found nothing more in the socket. A socket is read until it is,
+    // since only new data wakes a reader again.
+    bool drained() const { return drained_; }
 
   private:
     size_t Available() const { return end_ - begin_; }
@@ -66,6 +69,7 @@ class FrameBuffer {
     std::deque<ndk::ScopedFileDescriptor> descriptors_;
     size_t begin_ = 0;
     size_t end_ = 0;
+    bool drained_ = true;
 };
 
 // Bytes that all receive buffers of this process hold now.

@@ -206,7 +206,7 @@ void Looper::Remove(const Connection& connection) {
 }
 
 void Looper::Arm(const Connection& connection, bool input) {
-    const uint32_t events = (input ? uint32_t{EPOLLIN} : 0u) | EPOLLRDHUP | EPOLLONESHOT;
+    const uint32_t events = (input ? uint32_t{EPOLLIN} : 0u) | EPOLLRDHUP | EPOLLET;
     Control(EPOLL_CTL_MOD, connection.fd(), events, connection.serial());
 }
 

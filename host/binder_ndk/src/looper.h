@@ -51,8 +51,9 @@ class Looper {
     // Adds the connection disarmed; the connection arms itself.
     void Add(const std::shared_ptr<Connection>& connection);
     void Remove(const Connection& connection);
-    // Lets one waiting thread read the connection when data arrives (`input`) or only when the
-    // peer hangs up; Disarm stops both. Each wakes one thread once, then it is disarmed again.
+    // Wakes one waiting thread each time data arrives on the connection (`input`), or only when
+    // the peer hangs up; Disarm stops both. Arming wakes a thread at once for what is already
+    // there.
     void Arm(const Connection& connection, bool input);
     void Disarm(const Connection& connection);
     std::vector<std::shared_ptr<Connection>> Connections();
