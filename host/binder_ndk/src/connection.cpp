@@ -96,7 +96,7 @@ void Connection::ArmLocked(Armed armed) {
 void Connection::OnReadable(bool can_serve) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
-        // Whoever holds the role reads on for what woke this thread.
+        // Whoever holds the role arms again for what woke this thread.
         if (reading_ || dead_.load(std::memory_order_relaxed)) {
             more_ = true;
             return;
@@ -105,19 +105,11 @@ void Connection::OnReadable(bool can_serve) {
         more_ = false;
     }
     std::shared_ptr<Incoming> call;
-    bool alive;
-    while (true) {
-        alive = ReadAndHandle(false, &call);
+    bool alive = ReadAndHandle(false, &call);
+    {
         std::lock_guard<std::mutex> lock(mutex_);
-        if (alive && more_ && !dead_.load(std::memory_order_relaxed)) {
-            more_ = false;
-            continue;
-        }
         reading_ = false;
-        if (alive && !dead_.load(std::memory_order_relaxed) && armed_ != WantedLocked()) {
-            ArmLocked(WantedLocked());
-        }
-        break;
+        if (alive) RearmLocked();
     }
     if (!alive) {
         Die();
@@ -126,35 +118,39 @@ void Connection::OnReadable(bool can_serve) {
     if (call != nullptr) Dispatch(std::move(call), can_serve);
 }
 
+void Connection::RearmLocked() {
+    if (dead_.load(std::memory_order_relaxed)) return;
+    // Only new data wakes a thread again; arming does it for what is already there: bytes one
+    // read did not take (another connection's turn first), or data or a hang-up whose wake-up
+    // found the role taken.
+    if (more_ || !buffer_.drained() || armed_ != WantedLocked()) ArmLocked(WantedLocked());
+    more_ = false;
+}
+
 bool Connection::ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call) {
-    while (true) {
-        FrameBuffer::Result result = buffer_.Fill(fd_, wait);
-        if (result == FrameBuffer::Result::kOverLimit) {
-            fprintf(stderr, "binder: dropping peer %d: receive buffers over %zu bytes in all\n",
-                    peer_pid_, kMaxBufferedBytesPerProcess);
-            return false;
-        }
-        while (result == FrameBuffer::Result::kFrame) {
-            Frame frame;
-            buffer_.Take(&frame);
-            std::shared_ptr<Incoming> next;
-            if (!HandleFrame(frame, &next)) return false;
-            if (next != nullptr) {
-                // One call is served by the reader itself; any other that came with it is
-                // queued.
-                if (*call == nullptr) {
-                    *call = std::move(next);
-                } else {
-                    Dispatch(std::move(next), false);
-                }
-            }
-            result = buffer_.Check();
-        }
-        if (result != FrameBuffer::Result::kNoData) return false;
-        // A caller has what it waited for; the looper reads on until nothing is left, as what
-        // is already there will not wake it again.
-        if (wait || buffer_.drained()) return true;
+    FrameBuffer::Result result = buffer_.Fill(fd_, wait);
+    if (result == FrameBuffer::Result::kNoData) return true;
+    if (result == FrameBuffer::Result::kOverLimit) {
+        fprintf(stderr, "binder: dropping peer %d: receive buffers over %zu bytes in all\n",
+                peer_pid_, kMaxBufferedBytesPerProcess);
+        return false;
     }
+    while (result == FrameBuffer::Result::kFrame) {
+        Frame frame;
+        buffer_.Take(&frame);
+        std::shared_ptr<Incoming> next;
+        if (!HandleFrame(frame, &next)) return false;
+        if (next != nullptr) {
+            // One call is served by the reader itself; any other that came with it is queued.
+            if (*call == nullptr) {
+                *call = std::move(next);
+            } else {
+                Dispatch(std::move(next), false);
+            }
+        }
+        result = buffer_.Check();
+    }
+    return result == FrameBuffer::Result::kNoData;
 }
 
 bool Connection::HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call) {
@@ -491,12 +487,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             lock.lock();
             continue;
         }
-        // Arming again also wakes a thread for what came meanwhile, or for a hang-up whose
-        // wake-up found the role taken.
-        if (!dead_.load(std::memory_order_relaxed) && (more_ || armed_ != WantedLocked())) {
-            ArmLocked(WantedLocked());
-        }
-        more_ = false;
+        RearmLocked();
         // Another caller may be asleep waiting for the role.
         for (auto& entry : waiters_) {
             if (entry.second != &waiter && !entry.second->done) {

@@ -88,9 +88,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
         uint64_t count = 0;
     };
 
-    // Takes frames off the socket and handles them in stream order: with `wait` until at least
-    // one came, otherwise all there are. A call to run is left in `call`. False when the
-    // connection is finished.
+    // Takes what the socket has (with `wait`, at least one frame) and handles the frames in
+    // stream order; a call to run is left in `call`. False when the connection is finished.
     bool ReadAndHandle(bool wait, std::shared_ptr<Incoming>* call);
     // False when the peer broke the protocol.
     bool HandleFrame(Frame& frame, std::shared_ptr<Incoming>* call);
@@ -107,6 +106,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
         return watch_input_ ? Armed::kInput : Armed::kHangUp;
     }
     void ArmLocked(Armed armed) REQUIRES(mutex_);
+    // Arms as wanted when the reading role is given back.
+    void RearmLocked() REQUIRES(mutex_);
     void WatchInputLocked() REQUIRES(mutex_);
     void Serve(Incoming& call);
     binder_status_t ServeDump(Incoming& call);
@@ -161,7 +162,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     bool reading_ GUARDED_BY(mutex_) = false;  // the reading role is taken
     bool watch_input_ GUARDED_BY(mutex_) = false;
     Armed armed_ GUARDED_BY(mutex_) = Armed::kNone;
-    // Data or a hang-up woke a thread while the role was taken: its holder reads on.
+    // Data or a hang-up woke a thread while the role was taken: its holder arms again.
     bool more_ GUARDED_BY(mutex_) = false;
     FrameBuffer buffer_;  // used by the holder of the reading role only
 };

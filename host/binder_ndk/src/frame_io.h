@@ -49,8 +49,7 @@ class FrameBuffer {
     Result Check() const;
     // Moves the buffered frame out; Check must have given kFrame.
     void Take(Frame* frame);
-    // Whether the last read found nothing more in the socket. A socket is read until it is,
-    // since only new data wakes a reader again.
+    // Whether the last read found nothing more in the socket.
     bool drained() const { return drained_; }
 
   private:
