@@ -465,6 +465,24 @@ TEST_F(CrossProcessTest, OnewayCallsArrive) {
     }));
 }
 
+// More than one read takes, all in the socket at once: the rest is read as well, though no new
+// byte comes to wake anyone.
+TEST_F(CrossProcessTest, ABurstLargerThanOneReadIsServedWhole) {
+    auto service = ndk::SharedRefBase::make<TestService>();
+    ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "vyr.local"));
+    vyr_test::RawPeer peer(registry_.path(), "vyr.local");
+    ASSERT_TRUE(peer.connected());
+    const uint64_t target = peer.LookUp("vyr.local");
+    ASSERT_NE(0u, target);
+    // SetTorchLightState, the interface's ninth method.
+    constexpr int32_t kCalls = 400;
+    ASSERT_TRUE(peer.SendOnewayBurst(target, IVYRService::descriptor, 8, kCalls));
+    EXPECT_TRUE(Eventually([&] {
+        int32_t state = 0;
+        return service->Open(TestService::kQueryTorch, &state).isOk() && state == kCalls;
+    }));
+}
+
 TEST_F(CrossProcessTest, TransactionsOverOneMebibyteAreRefused) {
     std::shared_ptr<IVYRService> service = StartServer("vyr.test");
     ASSERT_NE(nullptr, service);

@@ -118,6 +118,29 @@ TEST(FrameBufferTest, AWaitingReadSleepsThroughThePeerTakingWhatItSent) {
     EXPECT_EQ(1u, sleeps) << "the waiting thread went to sleep more than once for one reply";
 }
 
+TEST(FrameBufferTest, AReadThatLeavesBytesInTheSocketIsNotDrained) {
+    SocketPair pair;
+    const FrameHeader frame = SmallFrameHeader();
+    // More than one read takes, less than the socket holds.
+    constexpr size_t kFrames = 600;
+    const std::vector<FrameHeader> frames(kFrames, frame);
+    pair.Write(frames.data(), frames.size() * sizeof(frame));
+    FrameBuffer buffer;
+    size_t taken = 0;
+    ASSERT_EQ(FrameBuffer::Result::kFrame, buffer.Fill(pair.reader(), false));
+    EXPECT_FALSE(buffer.drained());
+    FrameBuffer::Result result = FrameBuffer::Result::kFrame;
+    while (result == FrameBuffer::Result::kFrame) {
+        vyr_binder::Frame taken_frame;
+        buffer.Take(&taken_frame);
+        ++taken;
+        result = buffer.Fill(pair.reader(), false);
+    }
+    EXPECT_EQ(FrameBuffer::Result::kNoData, result);
+    EXPECT_EQ(kFrames, taken);
+    EXPECT_TRUE(buffer.drained());
+}
+
 TEST(FrameBufferTest, BuffersOfAllConnectionsStayUnderTheProcessLimit) {
     const FrameHeader header = LargeFrameHeader();
     // Each peer sends all of a large frame but its last byte, and hangs up.

@@ -114,6 +114,24 @@ bool RawPeer::SendCall(uint64_t target, uint64_t id, const std::string& descript
     return sent;
 }
 
+bool RawPeer::SendOnewayBurst(uint64_t target, const std::string& descriptor, uint32_t index,
+                              int32_t count) {
+    std::vector<uint8_t> burst;
+    for (int32_t value = 1; value <= count; ++value) {
+        AParcel* parcel = AParcel_create();
+        AParcel_writeInt32(parcel, vyr_binder::kInterfaceTokenMarker);
+        ndk::AParcel_writeString(parcel, descriptor);
+        AParcel_writeInt32(parcel, value);
+        const vyr_binder::FrameHeader header =
+            Header(FIRST_CALL_TRANSACTION + index, 0, target, FLAG_ONEWAY, parcel->data.size());
+        const uint8_t* bytes = reinterpret_cast<const uint8_t*>(&header);
+        burst.insert(burst.end(), bytes, bytes + sizeof(header));
+        burst.insert(burst.end(), parcel->data.begin(), parcel->data.end());
+        AParcel_delete(parcel);
+    }
+    return send(fd_, burst.data(), burst.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(burst.size());
+}
+
 int RawPeer::Unread() const {
     int bytes = -1;
     ioctl(fd_, SIOCOUTQ, &bytes);

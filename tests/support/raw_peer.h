@@ -30,6 +30,10 @@ class RawPeer {
     // proxy sends it; whole or not at all, without waiting when `wait` is false.
     bool SendCall(uint64_t target, uint64_t id, const std::string& descriptor, uint32_t index,
                   const std::vector<int32_t>& args, uint32_t flags = 0, bool wait = true);
+    // `count` oneway calls of method `index` with one int32 argument, 1 to `count`, in one
+    // write: all of them are in the socket before the other side wakes.
+    bool SendOnewayBurst(uint64_t target, const std::string& descriptor, uint32_t index,
+                         int32_t count);
     // Bytes sent that the other side has not read yet.
     int Unread() const;
     // True once the other side closed the connection.
