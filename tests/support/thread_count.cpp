@@ -32,6 +32,13 @@ bool Exiting(const std::string& tid) {
     return !fields || (flags & kExiting) != 0;
 }
 
+std::string ThreadName(const std::string& tid) {
+    std::ifstream comm("/proc/self/task/" + tid + "/comm");
+    std::string name;
+    std::getline(comm, name);
+    return name;
+}
+
 template <typename Visit>
 void ForEachLiveThread(Visit visit) {
     DIR* dir = opendir("/proc/self/task");
@@ -53,10 +60,7 @@ size_t ThreadCount() {
 std::string ThreadNames() {
     std::string names;
     ForEachLiveThread([&names](const std::string& tid) {
-        std::ifstream comm("/proc/self/task/" + tid + "/comm");
-        std::string name;
-        std::getline(comm, name);
-        names += (names.empty() ? "" : ", ") + name;
+        names += (names.empty() ? "" : ", ") + ThreadName(tid);
     });
     return names;
 }
@@ -70,9 +74,10 @@ bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
     return true;
 }
 
-std::map<pid_t, unsigned long> VoluntarySwitches() {
+std::map<pid_t, unsigned long> VoluntarySwitches(const std::string& prefix) {
     std::map<pid_t, unsigned long> switches;
-    ForEachLiveThread([&switches](const std::string& tid) {
+    ForEachLiveThread([&switches, &prefix](const std::string& tid) {
+        if (ThreadName(tid).compare(0, prefix.size(), prefix) != 0) return;
         std::ifstream status("/proc/self/task/" + tid + "/status");
         std::string line;
         while (std::getline(status, line)) {

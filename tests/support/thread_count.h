@@ -17,8 +17,9 @@ size_t ThreadCount();
 std::string ThreadNames();
 // Waits until the process has `count` threads; false on time-out.
 bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout);
-// How often each live thread of this process has gone to sleep so far, by thread id.
-std::map<pid_t, unsigned long> VoluntarySwitches();
+// How often each live thread of this process whose name starts with `prefix` has gone to sleep
+// so far, by thread id.
+std::map<pid_t, unsigned long> VoluntarySwitches(const std::string& prefix = "");
 // Waits until thread `tid` of this process sleeps (state S); false on time-out.
 bool WaitUntilAsleep(pid_t tid, std::chrono::milliseconds timeout);
 

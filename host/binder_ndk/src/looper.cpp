@@ -1,10 +1,12 @@
 #include "looper.h"
 
+#include <pthread.h>
 #include <sys/epoll.h>
 #include <sys/eventfd.h>
 #include <unistd.h>
 
 #include <cstdint>
+#include <cstdio>
 #include <utility>
 
 #include "connection.h"
@@ -41,7 +43,14 @@ bool Looper::OnRuntimeThread() {
 
 void Looper::SpawnLocked(Kind kind) {
     ++spawned_;
-    threads_.emplace_back([this, kind] { Run(kind); });
+    const uint32_t number = ++threads_named_;
+    threads_.emplace_back([this, kind, number] {
+        // As a device names its binder threads, so that they can be told apart in ps and top.
+        char name[16];
+        snprintf(name, sizeof(name), "binder:%d_%X", static_cast<int>(getpid()), number);
+        pthread_setname_np(pthread_self(), name);
+        Run(kind);
+    });
 }
 
 void Looper::ArmWorkLocked() {

@@ -95,6 +95,7 @@ class Looper {
     uint64_t next_serial_ GUARDED_BY(mutex_) = 1;
     uint32_t max_threads_ GUARDED_BY(mutex_) = kDefaultMaxThreads;
     uint32_t spawned_ GUARDED_BY(mutex_) = 0;
+    uint32_t threads_named_ GUARDED_BY(mutex_) = 0;   // for the threads' names, never reused
     uint32_t idle_executors_ GUARDED_BY(mutex_) = 0;  // waiting in epoll
     uint32_t serving_ GUARDED_BY(mutex_) = 0;         // running a call or queued work
     uint32_t joined_ GUARDED_BY(mutex_) = 0;

@@ -69,7 +69,11 @@ void FuzzConnection(const uint8_t* data, size_t size) {
     int fds[2];
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, fds) != 0) return;
     vyr_binder::Looper& looper = vyr_binder::ProcessState::Get().looper();
-    looper.Add(std::make_shared<vyr_binder::Connection>(fds[0]));
+    auto connection = std::make_shared<vyr_binder::Connection>(fds[0]);
+    looper.Add(connection);
+    // As a connection a peer opened: everything it sends is read.
+    connection->Watch(true);
+    connection.reset();
     size_t sent = 0;
     while (sent < size) {
         ssize_t n = send(fds[1], data + sent, size - sent, MSG_NOSIGNAL);
