@@ -93,9 +93,10 @@ void Connection::ArmLocked(Armed armed) {
     armed_ = armed;
 }
 
-void Connection::OnReadable(bool can_serve) {
+void Connection::OnReadable(bool can_serve, bool hung_up) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
+        hung_up_ = hung_up_ || hung_up;
         // Whoever holds the role arms again for what woke this thread.
         if (reading_ || dead_.load(std::memory_order_relaxed)) {
             more_ = true;
@@ -121,9 +122,11 @@ void Connection::OnReadable(bool can_serve) {
 void Connection::RearmLocked() {
     if (dead_.load(std::memory_order_relaxed)) return;
     // Only new data wakes a thread again; arming does it for what is already there: bytes one
-    // read did not take (another connection's turn first), or data or a hang-up whose wake-up
-    // found the role taken.
-    if (more_ || !buffer_.drained() || armed_ != WantedLocked()) ArmLocked(WantedLocked());
+    // read did not take (another connection's turn first), data or a hang-up whose wake-up
+    // found the role taken, or the end of the stream behind the last bytes of a peer that hung up.
+    if (more_ || hung_up_ || !buffer_.drained() || armed_ != WantedLocked()) {
+        ArmLocked(WantedLocked());
+    }
     more_ = false;
 }
 

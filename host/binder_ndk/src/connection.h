@@ -44,8 +44,9 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void Watch(bool input);
     // From now on the peer may call this process: its input is watched too.
     void WatchInput();
-    // The looper saw data: read one frame, then serve a call in it here (can_serve) or queue it.
-    void OnReadable(bool can_serve);
+    // The looper saw data (and the peer's hang-up when `hung_up`): read one frame, then serve a
+    // call in it here (can_serve) or queue it.
+    void OnReadable(bool can_serve, bool hung_up);
 
     int fd() const { return fd_; }
     uint64_t serial() const { return serial_; }
@@ -164,6 +165,9 @@ class Connection : public std::enable_shared_from_this<Connection> {
     Armed armed_ GUARDED_BY(mutex_) = Armed::kNone;
     // Data or a hang-up woke a thread while the role was taken: its holder arms again.
     bool more_ GUARDED_BY(mutex_) = false;
+    // The peer hung up: its last bytes and the end of the stream come with no further wake-up,
+    // so the reader arms again until a read finds the end.
+    bool hung_up_ GUARDED_BY(mutex_) = false;
     FrameBuffer buffer_;  // used by the holder of the reading role only
 };
 

@@ -168,8 +168,10 @@ void Looper::Run(Kind kind) {
         int n = epoll_wait(epoll_fd_, &event, 1, -1);
         lock.lock();
         if (executor) --idle_executors_;
-        if (n <= 0 || event.data.u64 == kStopTag) continue;
-        if (event.data.u64 == kWorkTag) {
+        // epoll_event is packed on x86-64: copy the tag out before binding a reference to it.
+        uint64_t tag = event.data.u64;
+        if (n <= 0 || tag == kStopTag) continue;
+        if (tag == kWorkTag) {
             // Only an executor takes work. Anyone else passes the wake-up on to an idle executor
             // (waiters are woken oldest first, so not back to itself); busy executors look at
             // the queue anyway before they wait again.
@@ -177,12 +179,12 @@ void Looper::Run(Kind kind) {
             if (!can_take && !queue_.empty() && idle_executors_ > 0) ArmWorkLocked();
             continue;
         }
-        auto it = connections_.find(event.data.u64);
+        auto it = connections_.find(tag);
         if (it == connections_.end()) continue;
         std::shared_ptr<Connection> connection = it->second;
         bool can_serve = kind != Kind::kLooper || started_;
         lock.unlock();
-        connection->OnReadable(can_serve);
+        connection->OnReadable(can_serve, (event.events & (EPOLLRDHUP | EPOLLHUP | EPOLLERR)) != 0);
         connection.reset();
         lock.lock();
     }
