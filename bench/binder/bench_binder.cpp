@@ -9,6 +9,7 @@
 // inherited socket.
 #include <aidl/android/vyr/BnVYRService.h>
 #include <aidl/android/vyr/IVYRService.h>
+#include <android-base/file.h>
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <benchmark/benchmark.h>
@@ -146,16 +147,6 @@ class SwitchCounter {
     const double start_;
 };
 
-bool ReadFull(int fd, char* buffer, size_t size) {
-    size_t done = 0;
-    while (done < size) {
-        ssize_t n = read(fd, buffer + done, size - done);
-        if (n <= 0) return false;
-        done += static_cast<size_t>(n);
-    }
-    return true;
-}
-
 // Arguments: request and reply bytes.
 void BM_RawSocketPingPong(benchmark::State& state) {
     const size_t request_bytes = static_cast<size_t>(state.range(0));
@@ -170,7 +161,7 @@ void BM_RawSocketPingPong(benchmark::State& state) {
     SwitchCounter switches(state, pid);
     for (auto _ : state) {
         if (write(fds[0], request, request_bytes) != static_cast<ssize_t>(request_bytes) ||
-            !ReadFull(fds[0], reply, reply_bytes)) {
+            !android::base::ReadFully(fds[0], reply, reply_bytes)) {
             state.SkipWithError("echo peer failed");
             break;
         }
@@ -332,7 +323,7 @@ int Echo(int fd, size_t request_bytes, size_t reply_bytes) {
     if (request_bytes > kMaxRawBytes || reply_bytes > kMaxRawBytes) return 2;
     char request[kMaxRawBytes];
     char reply[kMaxRawBytes] = {2};
-    while (ReadFull(fd, request, request_bytes)) {
+    while (android::base::ReadFully(fd, request, request_bytes)) {
         if (write(fd, reply, reply_bytes) != static_cast<ssize_t>(reply_bytes)) break;
     }
     return 0;

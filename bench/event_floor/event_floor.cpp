@@ -6,6 +6,7 @@
 //   bench_event_floor [--clients N] [--period-ms P] [--frame-hz F] [--seconds S]
 //
 // Prints the process's CPU time per event delivered.
+#include <android-base/file.h>
 #include <poll.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -41,20 +42,10 @@ std::atomic<long> g_events{0};
 std::mutex g_sample_mutex;
 long g_sample = 0;
 
-bool ReadFull(int fd, char* buffer, size_t size) {
-    size_t done = 0;
-    while (done < size) {
-        ssize_t n = read(fd, buffer + done, size - done);
-        if (n <= 0) return false;
-        done += static_cast<size_t>(n);
-    }
-    return true;
-}
-
 void Echo(int fd) {
     char event[kEventBytes];
     char reply[kReplyBytes] = {1};
-    while (ReadFull(fd, event, sizeof(event))) {
+    while (android::base::ReadFully(fd, event, sizeof(event))) {
         if (write(fd, reply, sizeof(reply)) != static_cast<ssize_t>(sizeof(reply))) break;
     }
     _exit(0);
@@ -103,7 +94,7 @@ void Client(const Options& options, int fd, int index) {
             // Waiting as the runtime does: poll, then read.
             pollfd readable{fd, POLLIN, 0};
             poll(&readable, 1, -1);
-            if (!ReadFull(fd, reply, sizeof(reply))) return;
+            if (!android::base::ReadFully(fd, reply, sizeof(reply))) return;
             g_events.fetch_add(1, std::memory_order_relaxed);
         }
         TimedWait(std::chrono::milliseconds(options.period_ms));

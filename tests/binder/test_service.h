@@ -20,10 +20,9 @@ using aidl::android::vyr::IVYRService;
 // A small IVYRService whose results tell what it received, for round trips through the runtime.
 // Open(kQueryTorch) returns the last torch state; Open(kTorchCalleeLater) returns at once and
 // 100 ms later looks up kCalleeName and sets its torch state to kCalleeTorch; Close(n > 0)
-// delivers n events to the stored
-// callback from another thread; EnableLowPower(kBlockForever, ...) never returns. Its dump writes
-// "dump:" and its arguments on one line; with the argument "big", 4 MiB after that, and with
-// "slow", a line every 10 ms for 10 s.
+// delivers n events to the stored callback from another thread; EnableLowPower(kBlockForever,
+// ...) never returns. Its dump writes "dump:" and its arguments on one line; with the argument
+// "big", 4 MiB after that, and with "slow", a line every 10 ms for 10 s.
 class TestService : public BnVYRService {
   public:
     static constexpr int32_t kQueryTorch = -100;

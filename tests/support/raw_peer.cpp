@@ -35,17 +35,34 @@ vyr_binder::FrameHeader Header(uint32_t code, uint64_t id, uint64_t target, uint
     return header;
 }
 
-bool SendFrame(int fd, const vyr_binder::FrameHeader& header, const AParcel* parcel, bool wait) {
-    std::vector<uint8_t> frame(sizeof(header) + header.data_size);
-    std::memcpy(frame.data(), &header, sizeof(header));
-    if (parcel != nullptr) {
-        std::memcpy(frame.data() + sizeof(header), parcel->data.data(), header.data_size);
-    }
+// Appends `header` and the parcel's data to `bytes`.
+void AppendFrame(const vyr_binder::FrameHeader& header, const AParcel& parcel,
+                 std::vector<uint8_t>* bytes) {
+    const uint8_t* raw = reinterpret_cast<const uint8_t*>(&header);
+    bytes->insert(bytes->end(), raw, raw + sizeof(header));
+    bytes->insert(bytes->end(), parcel.data.begin(), parcel.data.end());
+}
+
+// A call of interface method `index` of `descriptor` with int32 arguments, as a generated proxy
+// sends it.
+void AppendCall(uint64_t target, uint64_t id, const std::string& descriptor, uint32_t index,
+                const std::vector<int32_t>& args, uint32_t flags, std::vector<uint8_t>* bytes) {
+    AParcel* parcel = AParcel_create();
+    AParcel_writeInt32(parcel, vyr_binder::kInterfaceTokenMarker);
+    ndk::AParcel_writeString(parcel, descriptor);
+    for (int32_t arg : args) AParcel_writeInt32(parcel, arg);
+    AppendFrame(Header(FIRST_CALL_TRANSACTION + index, id, target, flags, parcel->data.size()),
+                *parcel, bytes);
+    AParcel_delete(parcel);
+}
+
+// Whole or not at all; without `wait`, only if the socket has room now.
+bool SendBytes(int fd, const std::vector<uint8_t>& bytes, bool wait) {
     if (!wait) {
         pollfd p{fd, POLLOUT, 0};
         if (poll(&p, 1, 0) != 1 || (p.revents & POLLOUT) == 0) return false;
     }
-    return send(fd, frame.data(), frame.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(frame.size());
+    return send(fd, bytes.data(), bytes.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(bytes.size());
 }
 
 }  // namespace
@@ -73,10 +90,10 @@ RawPeer::~RawPeer() {
 uint64_t RawPeer::LookUp(const std::string& service) {
     AParcel* request = AParcel_create();
     ndk::AParcel_writeString(request, service);
-    const bool sent =
-        SendFrame(fd_, Header(kLookupCode, kLookupId, 0, 0, request->data.size()), request, true);
+    std::vector<uint8_t> bytes;
+    AppendFrame(Header(kLookupCode, kLookupId, 0, 0, request->data.size()), *request, &bytes);
     AParcel_delete(request);
-    if (!sent) return 0;
+    if (!SendBytes(fd_, bytes, true)) return 0;
     vyr_binder::FrameBuffer buffer;
     vyr_binder::Frame frame;
     while (buffer.Fill(fd_, true) == vyr_binder::FrameBuffer::Result::kFrame) {
@@ -103,33 +120,18 @@ bool RawPeer::SendHeaderOnly(uint32_t data_size) {
 
 bool RawPeer::SendCall(uint64_t target, uint64_t id, const std::string& descriptor, uint32_t index,
                        const std::vector<int32_t>& args, uint32_t flags, bool wait) {
-    AParcel* parcel = AParcel_create();
-    AParcel_writeInt32(parcel, vyr_binder::kInterfaceTokenMarker);
-    ndk::AParcel_writeString(parcel, descriptor);
-    for (int32_t arg : args) AParcel_writeInt32(parcel, arg);
-    const bool sent = SendFrame(
-        fd_, Header(FIRST_CALL_TRANSACTION + index, id, target, flags, parcel->data.size()), parcel,
-        wait);
-    AParcel_delete(parcel);
-    return sent;
+    std::vector<uint8_t> frame;
+    AppendCall(target, id, descriptor, index, args, flags, &frame);
+    return SendBytes(fd_, frame, wait);
 }
 
 bool RawPeer::SendOnewayBurst(uint64_t target, const std::string& descriptor, uint32_t index,
                               int32_t count) {
     std::vector<uint8_t> burst;
     for (int32_t value = 1; value <= count; ++value) {
-        AParcel* parcel = AParcel_create();
-        AParcel_writeInt32(parcel, vyr_binder::kInterfaceTokenMarker);
-        ndk::AParcel_writeString(parcel, descriptor);
-        AParcel_writeInt32(parcel, value);
-        const vyr_binder::FrameHeader header =
-            Header(FIRST_CALL_TRANSACTION + index, 0, target, FLAG_ONEWAY, parcel->data.size());
-        const uint8_t* bytes = reinterpret_cast<const uint8_t*>(&header);
-        burst.insert(burst.end(), bytes, bytes + sizeof(header));
-        burst.insert(burst.end(), parcel->data.begin(), parcel->data.end());
-        AParcel_delete(parcel);
+        AppendCall(target, 0, descriptor, index, {value}, FLAG_ONEWAY, &burst);
     }
-    return send(fd_, burst.data(), burst.size(), MSG_NOSIGNAL) == static_cast<ssize_t>(burst.size());
+    return SendBytes(fd_, burst, true);
 }
 
 int RawPeer::Unread() const {

@@ -13,8 +13,6 @@ namespace {
 // The kernel's PF_EXITING task flag.
 constexpr unsigned long kExiting = 0x4;
 
-// A joined thread wakes its joiner before the kernel has removed its task; such a task is past
-// the point of return and is not counted.
 // The fields of a task's stat line after its name; empty when the task is gone.
 std::string StatFields(const std::string& tid) {
     std::ifstream stat("/proc/self/task/" + tid + "/stat");
@@ -23,6 +21,8 @@ std::string StatFields(const std::string& tid) {
     return line.substr(line.rfind(')') + 1);
 }
 
+// A joined thread wakes its joiner before the kernel has removed its task; such a task is past
+// the point of return and is not counted.
 bool Exiting(const std::string& tid) {
     std::istringstream fields(StatFields(tid));
     std::string skipped;

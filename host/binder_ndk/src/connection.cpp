@@ -119,6 +119,12 @@ void Connection::OnReadable(bool can_serve, bool hung_up) {
     if (call != nullptr) Dispatch(std::move(call), can_serve);
 }
 
+void Connection::TakeReadingRoleLocked() {
+    reading_ = true;
+    // The caller reads for itself: input must not wake a looper thread meanwhile.
+    if (armed_ == Armed::kInput) ArmLocked(Armed::kNone);
+}
+
 void Connection::RearmLocked() {
     if (dead_.load(std::memory_order_relaxed)) return;
     // Only new data wakes a thread again; arming does it for what is already there: bytes one
@@ -440,8 +446,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         if (!oneway) {
             waiters_.emplace_back(id, &waiter);
             reader = !reading_;
-            reading_ = true;
-            if (reader && armed_ == Armed::kInput) ArmLocked(Armed::kNone);
+            if (reader) TakeReadingRoleLocked();
         }
     }
     uint64_t parent = ScopedCallContext::ParentFor(this);
@@ -475,8 +480,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
                 continue;
             }
             // Nobody is reading: read for ourselves, sparing a hand-over for our reply.
-            reading_ = true;
-            if (armed_ == Armed::kInput) ArmLocked(Armed::kNone);
+            TakeReadingRoleLocked();
         }
         reader = false;
         lock.unlock();

@@ -107,6 +107,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
         return watch_input_ ? Armed::kInput : Armed::kHangUp;
     }
     void ArmLocked(Armed armed) REQUIRES(mutex_);
+    // A caller takes the reading role to read its own reply.
+    void TakeReadingRoleLocked() REQUIRES(mutex_);
     // Arms as wanted when the reading role is given back.
     void RearmLocked() REQUIRES(mutex_);
     void WatchInputLocked() REQUIRES(mutex_);
