@@ -9,7 +9,7 @@ ClientEntry::~ClientEntry() {
     Disable();
 }
 
-void ClientEntry::Disable() {
+void ClientEntry::StopNotify() {
     state = kClientDisabled;
     if (notify_cv) {
         // Taking the mutex once orders the state change before any wait that has not yet begun,
@@ -17,6 +17,10 @@ void ClientEntry::Disable() {
         { std::lock_guard<std::mutex> lock(*notify_mutex); }
         notify_cv->notify_all();
     }
+}
+
+void ClientEntry::Disable() {
+    StopNotify();
     if (notify_thread && notify_thread->joinable()) {
         if (notify_thread->get_id() == std::this_thread::get_id()) {
             notify_thread->detach();

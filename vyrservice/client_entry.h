@@ -8,10 +8,13 @@
 #include <atomic>
 #include <condition_variable>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <mutex>
 #include <thread>
 #include <utility>
+
+#include "client_process_watcher.h"
 
 namespace android {
 namespace vyr {
@@ -39,6 +42,12 @@ struct ClientEntry {
     // Called on that thread itself (a nested call from the client's OnEvent), it lets the thread
     // go instead of joining it: the thread ends when OnEvent returns, holding the entry until then.
     void Disable();
+    // Marks the client disabled and wakes its notification thread without waiting for it to end:
+    // for a caller that holds a lock which that thread may be waiting for (through a nested call
+    // from OnEvent). The thread, its condition variable and mutex stay until Disable().
+    void StopNotify();
+    // Stopped by StopNotify, and its thread not yet joined.
+    bool AwaitsJoin() const { return state == kClientDisabled && notify_thread != nullptr; }
 
     const int32_t mode;
     int32_t period = 0;
@@ -57,9 +66,15 @@ struct ClientEntry {
     // Owned by the service, which keeps every cookie for as long as a link made with it can
     // fire, also after this entry is gone.
     const DeathCookie* death_cookie = nullptr;
-    // The process that opened the handle, when it is not the service's own; watched so that its
-    // end closes the handle even without a callback to link to.
+    // The process that opened the handle, when it is not the service's own (for the dump).
     pid_t opener_pid = 0;
+    // The processes that use the handle: the opener and every caller of a method on it since,
+    // by the watcher's id (a pid alone may name a later process). Without a linked callback the
+    // handle goes when the last of them has ended.
+    std::map<ClientProcessWatcher::ProcessId, pid_t> processes;
+    // A caller that could not be watched (the service's own process, or a failed pidfd): its
+    // end cannot be known, so the handle is never released for the end of the others.
+    bool unwatched_user = false;
     // For the dump: events handed to the callback, and polls answered with no new sample.
     std::atomic<uint64_t> events_delivered{0};
     std::atomic<uint64_t> polls_refused{0};

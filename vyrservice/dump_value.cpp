@@ -7,30 +7,85 @@ namespace vyr {
 namespace binder {
 namespace {
 
+// The length of the well-formed UTF-8 sequence at `at` (no overlong form, no surrogate, nothing
+// above U+10FFFF), or 0 if the bytes there are not one.
+size_t Utf8SequenceLength(const std::string& text, size_t at) {
+    const auto byte = [&text](size_t i) { return static_cast<unsigned char>(text[i]); };
+    const unsigned char lead = byte(at);
+    if (lead < 0x80) return 1;
+    size_t length;
+    unsigned char low = 0x80;
+    unsigned char high = 0xBF;
+    if (lead >= 0xC2 && lead <= 0xDF) {
+        length = 2;
+    } else if (lead >= 0xE0 && lead <= 0xEF) {
+        length = 3;
+        if (lead == 0xE0) low = 0xA0;
+        if (lead == 0xED) high = 0x9F;
+    } else if (lead >= 0xF0 && lead <= 0xF4) {
+        length = 4;
+        if (lead == 0xF0) low = 0x90;
+        if (lead == 0xF4) high = 0x8F;
+    } else {
+        return 0;
+    }
+    if (at + length > text.size()) return 0;
+    if (byte(at + 1) < low || byte(at + 1) > high) return 0;
+    for (size_t i = 2; i < length; ++i) {
+        if (byte(at + i) < 0x80 || byte(at + i) > 0xBF) return 0;
+    }
+    return length;
+}
+
+// JSON must be UTF-8: a byte that starts no well-formed sequence becomes U+FFFD.
 void AppendJsonString(const std::string& text, std::string* out) {
     out->push_back('"');
-    for (unsigned char c : text) {
-        switch (c) {
-            case '"':
-                *out += "\\\"";
-                break;
-            case '\\':
-                *out += "\\\\";
-                break;
-            case '\n':
-                *out += "\\n";
-                break;
-            default:
-                if (c < 0x20) {
-                    char escaped[8];
-                    snprintf(escaped, sizeof(escaped), "\\u%04x", c);
-                    *out += escaped;
-                } else {
-                    out->push_back(static_cast<char>(c));
-                }
+    for (size_t at = 0; at < text.size();) {
+        const unsigned char c = static_cast<unsigned char>(text[at]);
+        const size_t length = Utf8SequenceLength(text, at);
+        if (length == 0) {
+            *out += "\\ufffd";
+            ++at;
+            continue;
         }
+        if (length > 1) {
+            out->append(text, at, length);
+        } else if (c == '"') {
+            *out += "\\\"";
+        } else if (c == '\\') {
+            *out += "\\\\";
+        } else if (c == '\n') {
+            *out += "\\n";
+        } else if (c < 0x20) {
+            char escaped[8];
+            snprintf(escaped, sizeof(escaped), "\\u%04x", c);
+            *out += escaped;
+        } else {
+            out->push_back(static_cast<char>(c));
+        }
+        at += length;
     }
     out->push_back('"');
+}
+
+// Text for a terminal: control characters and bytes that are not UTF-8 are shown as \xNN, so
+// that they can neither break the layout nor garble the screen.
+std::string ReadableText(const std::string& text) {
+    std::string out;
+    for (size_t at = 0; at < text.size();) {
+        const unsigned char c = static_cast<unsigned char>(text[at]);
+        const size_t length = Utf8SequenceLength(text, at);
+        if (length == 0 || c < 0x20 || c == 0x7F) {
+            char escaped[8];
+            snprintf(escaped, sizeof(escaped), "\\x%02x", c);
+            out += escaped;
+            ++at;
+            continue;
+        }
+        out.append(text, at, length);
+        at += length;
+    }
+    return out;
 }
 
 }  // namespace
@@ -68,7 +123,7 @@ std::string DumpValue::ScalarText() const {
         case Kind::kInt:
             return std::to_string(int_);
         case Kind::kString:
-            return string_;
+            return ReadableText(string_);
         default:
             return "-";
     }

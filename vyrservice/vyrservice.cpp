@@ -16,6 +16,7 @@
 #include <chrono>
 #include <cstdlib>
 #include <cstring>
+#include <optional>
 
 #include "event_conversion.h"
 #include "sensor_modes.h"
@@ -69,7 +70,9 @@ std::chrono::system_clock::time_point SystemDeadline(std::chrono::steady_clock::
 
 VYRService::VYRService(const ServiceConfig& config)
     : process_watcher_(std::make_unique<ClientProcessWatcher>(
-          [this](pid_t pid) { HandleClientProcessExit(pid); })) {
+          [this](ClientProcessWatcher::ProcessId id, pid_t pid) {
+              HandleClientProcessExit(id, pid);
+          })) {
     display_handle_ = NewHandle();
     std::this_thread::sleep_for(config.startup_delay);
     worker_threads_.reserve(2);
@@ -190,12 +193,12 @@ ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {
     } else {
         const int32_t handle = NewHandle();
         auto entry = std::make_shared<ClientEntry>(mode);
-        const pid_t caller = AIBinder_getCallingPid();
         std::string opened =
             "open handle " + std::to_string(handle) + " mode " + std::to_string(mode);
-        if (caller > 0 && caller != getpid() && process_watcher_->Watch(caller)) {
-            entry->opener_pid = caller;
-            opened += " pid " + std::to_string(caller);
+        NoteCaller(entry.get());
+        if (!entry->processes.empty()) {
+            entry->opener_pid = entry->processes.begin()->second;
+            opened += " pid " + std::to_string(entry->opener_pid);
         }
         clients_.emplace(handle, std::move(entry));
         ++num_clients_;
@@ -221,17 +224,40 @@ void VYRService::CloseInternal(int32_t handle) {
     --num_clients_;
     RecordEvent("close handle " + std::to_string(handle));
     UnlinkDeath(entry.get());
+    ForgetProcesses(*entry);
+    SweepDeathLinks();
+    // Its death handler joins the thread and drops the callback after releasing the API lock.
+    if (entry->AwaitsJoin()) return;
     // The notification thread stops before the callback is dropped; one that is running this
     // very call (from OnEvent) keeps the entry until it has ended.
     entry->Disable();
     entry->callback.reset();
-    const pid_t opener = entry->opener_pid;
-    if (opener != 0 && std::none_of(clients_.begin(), clients_.end(), [opener](const auto& client) {
-            return client.second->opener_pid == opener;
-        })) {
-        process_watcher_->Unwatch(opener);
+}
+
+void VYRService::NoteCaller(ClientEntry* entry) {
+    NoteProcess(entry, AIBinder_getCallingPid());
+}
+
+void VYRService::NoteProcess(ClientEntry* entry, pid_t pid) {
+    if (pid <= 0 || pid == getpid()) {
+        entry->unwatched_user = true;
+        return;
     }
-    SweepDeathLinks();
+    const std::optional<ClientProcessWatcher::ProcessId> id = process_watcher_->Watch(pid);
+    if (!id) {
+        entry->unwatched_user = true;
+        return;
+    }
+    entry->processes.emplace(*id, pid);
+}
+
+void VYRService::ForgetProcesses(const ClientEntry& entry) {
+    for (const auto& [id, pid] : entry.processes) {
+        const bool shared = std::any_of(
+            clients_.begin(), clients_.end(),
+            [id = id](const auto& client) { return client.second->processes.count(id) != 0; });
+        if (!shared) process_watcher_->Unwatch(id);
+    }
 }
 
 // Enable, disable and low power.
@@ -245,6 +271,7 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
         return Ok();
     }
     ClientEntry& entry = *it->second;
+    NoteCaller(&entry);
     if (entry.state == kClientEnabled) {
         *result = -EEXIST;
         return Ok();
@@ -269,11 +296,13 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
 
 ndk::ScopedAStatus VYRService::Disable(int32_t handle) {
     LOCK_API();
+    auto it = clients_.find(handle);
+    if (it != clients_.end()) NoteCaller(it->second.get());
     DisableInternal(handle, /*client_died=*/false);
     return Ok();
 }
 
-void VYRService::DisableInternal(int32_t handle, bool /*client_died*/) {
+void VYRService::DisableInternal(int32_t handle, bool client_died) {
     auto it = clients_.find(handle);
     if (it == clients_.end()) {
         ALOGW("%s invalid handle %d", __func__, handle);
@@ -285,7 +314,11 @@ void VYRService::DisableInternal(int32_t handle, bool /*client_died*/) {
         return;
     }
     ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
-    entry.Disable();
+    if (client_died) {
+        entry.StopNotify();
+    } else {
+        entry.Disable();
+    }
     QueueForMode(entry.mode).PushAndSignal(WorkItem{false, entry.mode, handle, 0});
     RecordEvent("disable handle " + std::to_string(handle));
 }
@@ -298,6 +331,7 @@ ndk::ScopedAStatus VYRService::EnableLowPower(int32_t handle, bool enable, int32
         *result = -ENOSYS;
         return Ok();
     }
+    NoteCaller(it->second.get());
     if (it->second->mode == kRangeMode) {
         *result = -EINVAL;
         return Ok();
@@ -321,6 +355,7 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
         return Ok();
     }
     ClientEntry& entry = *it->second;
+    NoteCaller(&entry);
     if (entry.state == kClientEnabled) {
         // The notification thread reads the callback without a lock.
         ALOGE("%s failed. callback can only be set at DISABLE state", __func__);
@@ -406,42 +441,60 @@ void VYRService::OnBinderDied(void* cookie) {
 }
 
 void VYRService::HandleBinderDied(AIBinder* binder) {
-    LOCK_API();
-    auto it = std::find_if(clients_.begin(), clients_.end(), [binder](const auto& client) {
-        return client.second->callback_binder.get() == binder;
-    });
-    if (it == clients_.end()) {
-        return;
+    std::vector<std::shared_ptr<ClientEntry>> released;
+    {
+        LOCK_API();
+        auto it = std::find_if(clients_.begin(), clients_.end(), [binder](const auto& client) {
+            return client.second->callback_binder.get() == binder;
+        });
+        if (it != clients_.end()) ReleaseDeadClient(it->first, "callback", &released);
     }
-    ReleaseDeadClient(it->first, "callback");
+    FinishRelease(&released);
 }
 
-void VYRService::ReleaseDeadClient(int32_t handle, const std::string& cause) {
-    ClientEntry& entry = *clients_.at(handle);
-    ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry.mode);
+void VYRService::ReleaseDeadClient(int32_t handle, const std::string& cause,
+                                   std::vector<std::shared_ptr<ClientEntry>>* released) {
+    std::shared_ptr<ClientEntry> entry = clients_.at(handle);
+    ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry->mode);
     RecordEvent("death of handle " + std::to_string(handle) + " (" + cause + ")");
-    if (entry.death_recipient != nullptr) {
+    if (entry->death_recipient != nullptr) {
         // The cookie is deliberately null: every link of the recipient on the binder goes.
-        AIBinder_unlinkToDeath(entry.callback_binder.get(), entry.death_recipient, nullptr);
+        AIBinder_unlinkToDeath(entry->callback_binder.get(), entry->death_recipient, nullptr);
     }
     DisableInternal(handle, /*client_died=*/true);
     CloseInternal(handle);
+    released->push_back(std::move(entry));
 }
 
-void VYRService::HandleClientProcessExit(pid_t pid) {
-    LOCK_API();
-    std::vector<int32_t> handles;
-    for (const auto& [handle, entry] : clients_) {
-        if (entry->opener_pid == pid) {
-            handles.push_back(handle);
+void VYRService::FinishRelease(std::vector<std::shared_ptr<ClientEntry>>* released) {
+    for (const std::shared_ptr<ClientEntry>& entry : *released) {
+        entry->Disable();
+        entry->callback.reset();
+    }
+    released->clear();
+}
+
+void VYRService::HandleClientProcessExit(ClientProcessWatcher::ProcessId id, pid_t pid) {
+    std::vector<std::shared_ptr<ClientEntry>> released;
+    {
+        LOCK_API();
+        std::vector<int32_t> handles;
+        for (const auto& [handle, entry] : clients_) {
+            if (entry->processes.erase(id) == 0) continue;
+            // A linked callback's death notice alone releases its handle; a process that could
+            // not be watched may still be using it.
+            if (entry->processes.empty() && !entry->unwatched_user &&
+                entry->death_recipient == nullptr) {
+                handles.push_back(handle);
+            }
+        }
+        // The same record and clean-up as a death notice.
+        for (int32_t handle : handles) {
+            ALOGI("Receive binder death callback");
+            ReleaseDeadClient(handle, "process " + std::to_string(pid), &released);
         }
     }
-    // The same record and clean-up as a death notice; closing unlinks the callback, so a notice
-    // of the same death cannot handle the client twice.
-    for (int32_t handle : handles) {
-        ALOGI("Receive binder death callback");
-        ReleaseDeadClient(handle, "process " + std::to_string(pid));
-    }
+    FinishRelease(&released);
 }
 
 // Sensor parameters and torch state.
@@ -456,6 +509,7 @@ ndk::ScopedAStatus VYRService::ConfigureParameters(int32_t handle,
         *result = -ENOSYS;
         return Ok();
     }
+    NoteCaller(it->second.get());
     const int32_t mode = it->second->mode;
     if (mode != kRangeMode) {
         ALOGE("%s, mode %d is not supported", __func__, mode);
@@ -780,6 +834,7 @@ ndk::ScopedAStatus VYRService::PollOnce(int32_t handle, Event* event, int32_t* r
         *result = -EINVAL;
         return Ok();
     }
+    NoteCaller(it->second.get());
     *result = PollInternal(handle, it->second->mode, event) ? 0 : -ENODATA;
     if (*result != 0) ++it->second->polls_refused;
     return Ok();

@@ -75,8 +75,10 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     WorkQueue& QueueForMode(int32_t mode);
 
     void CloseInternal(int32_t handle) REQUIRES(api_lock_);
-    // The one disable path, of Disable and of a client's death; `client_died` tells which, and
-    // changes nothing: both release the client alike.
+    // The one disable path, of Disable and of a client's death. For a dead client
+    // (`client_died`) the notification thread is stopped but not joined: the death handler
+    // joins it once it has released the API lock, since that thread may be inside OnEvent
+    // waiting for the lock through a nested call.
     void DisableInternal(int32_t handle, bool client_died) REQUIRES(api_lock_);
     void HandleBinderDied(AIBinder* binder) EXCLUDES(api_lock_);
     static void OnBinderDied(void* cookie);
@@ -85,11 +87,22 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     void UnlinkDeath(ClientEntry* entry) REQUIRES(api_lock_);
     // Frees the links that the runtime has let go of; called with the API lock held.
     void SweepDeathLinks() REQUIRES(api_lock_) EXCLUDES(links_mutex_);
-    // Disables and closes every client that the ended process opened, as a death notice does.
-    void HandleClientProcessExit(pid_t pid) EXCLUDES(api_lock_);
+    // Adds the caller of the current binder method to the processes that use the client.
+    void NoteCaller(ClientEntry* entry) REQUIRES(api_lock_);
+    void NoteProcess(ClientEntry* entry, pid_t pid) REQUIRES(api_lock_);
+    // Stops watching the processes of a client that left the table, unless another client's
+    // handle is used by them too.
+    void ForgetProcesses(const ClientEntry& entry) REQUIRES(api_lock_);
+    // One of the processes that use a handle has ended: a handle without a linked callback goes
+    // when the last of them has, as a death notice would release it.
+    void HandleClientProcessExit(ClientProcessWatcher::ProcessId id, pid_t pid) EXCLUDES(api_lock_);
     // What a client's death does, whichever way it was learnt: the log line, then the shared
-    // internal disable and close.
-    void ReleaseDeadClient(int32_t handle, const std::string& cause) REQUIRES(api_lock_);
+    // internal disable and close. The entry goes to `released`, for FinishRelease.
+    void ReleaseDeadClient(int32_t handle, const std::string& cause,
+                           std::vector<std::shared_ptr<ClientEntry>>* released) REQUIRES(api_lock_);
+    // Joins the notification threads of released clients and drops their callbacks; called
+    // without the API lock.
+    static void FinishRelease(std::vector<std::shared_ptr<ClientEntry>>* released);
 
     void WorkLoop(unsigned int sensor_type);
     void EnableWork(const WorkItem& item, ServiceModeParams* params, unsigned int sensor_type);

@@ -89,6 +89,7 @@ DumpValue VYRService::BuildDump(steady_clock::time_point deadline) {
         modes.Append(DumpModeBlock(index));
     }
     dump.Set("clients", std::move(clients));
+    dump.Set("watched_processes", static_cast<uint64_t>(process_watcher_->WatchedCount()));
     dump.Set("work_queues", DumpWorkQueues());
     dump.Set("display", DumpDisplay());
     {
@@ -151,6 +152,9 @@ DumpValue VYRService::DumpClientsLocked() const {
         client.Set("period_ms", entry->period);
         client.Set("callback", entry->callback != nullptr);
         client.Set("pid", entry->opener_pid > 0 ? DumpValue(entry->opener_pid) : DumpValue());
+        DumpValue& processes = client.Set("processes", DumpValue::Array());
+        for (const auto& [id, pid] : entry->processes) processes.Append(pid);
+        client.Set("unwatched_user", entry->unwatched_user);
         client.Set("events_delivered", entry->events_delivered.load());
         client.Set("polls_refused", entry->polls_refused.load());
     }

@@ -429,6 +429,97 @@ TEST_F(CrossProcessTest, ACallbackClientsDeathIsHandledOnce) {
         << "the callback's death link and the process's end both handled the client";
 }
 
+TEST_F(CrossProcessTest, AHandleOutlivesItsOpenerWhileAnotherProcessUsesIt) {
+    auto opener = Vyrctl({"shell"});
+    auto user = Vyrctl({"shell"});
+    const std::string h = OpenInShell(opener.get());
+    ASSERT_EQ(ShellCommand(user.get(), "enable " + h + " 50"), "0");
+    ASSERT_TRUE(process_->WaitForSensorState("range.enabled", "1", kWait));
+    KillClient(opener.get());
+    // A later death, handled after anything the opener's end did.
+    auto marker = Vyrctl({"shell"});
+    const std::string m = OpenInShell(marker.get());
+    KillClient(marker.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(m), kWait)) << process_->Log();
+
+    EXPECT_EQ(process_->LogCount(DiedLine(h)), 0u) << "released while another process uses it";
+    EXPECT_EQ(ShellCommand(user.get(), "enable " + h + " 50"), "-17 (already enabled)");
+    const std::string polled = ShellCommand(user.get(), "poll " + h);
+    EXPECT_TRUE(polled.rfind("0 ", 0) == 0 || polled.rfind("-61", 0) == 0) << polled;
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "1", kWait));
+
+    // The last of its processes gone, the handle goes, once.
+    const size_t notices = process_->LogCount("Receive binder death callback");
+    KillClient(user.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(h), kWait)) << process_->Log();
+    EXPECT_TRUE(WaitForUnknownHandle(std::atoi(h.c_str())));
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+    EXPECT_EQ(process_->LogCount(DiedLine(h)), 1u);
+    EXPECT_EQ(process_->LogCount("Receive binder death callback"), notices + 1);
+}
+
+TEST_F(CrossProcessTest, CallbackEventsGoOnWhenTheOpenerEnds) {
+    auto opener = Vyrctl({"shell"});
+    auto user = Vyrctl({"shell"});
+    const std::string h = OpenInShell(opener.get());
+    ASSERT_EQ(ShellCommand(user.get(), "callback " + h), "0");
+    ASSERT_EQ(ShellCommand(user.get(), "enable " + h + " 50"), "0");
+    ASSERT_TRUE(user->ReadLineStartingWith("event " + h + " ", kWait));
+    KillClient(opener.get());
+    auto marker = Vyrctl({"shell"});
+    const std::string m = OpenInShell(marker.get());
+    KillClient(marker.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(m), kWait)) << process_->Log();
+
+    // Events still come after the opener's end has been handled.
+    for (int i = 0; i < 3; ++i) {
+        EXPECT_TRUE(user->ReadLineStartingWith("event " + h + " ", kWait)) << "event " << i;
+    }
+    EXPECT_EQ(process_->LogCount(DiedLine(h)), 0u);
+    const size_t notices = process_->LogCount("Receive binder death callback");
+    KillClient(user.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(h), kWait)) << process_->Log();
+    EXPECT_TRUE(WaitForUnknownHandle(std::atoi(h.c_str())));
+    EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+    // Another death marks the end of whatever notices the first one could bring.
+    auto last = Vyrctl({"shell"});
+    const std::string l = OpenInShell(last.get());
+    KillClient(last.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(l), kWait));
+    EXPECT_EQ(process_->LogCount(DiedLine(h)), 1u);
+    EXPECT_EQ(process_->LogCount("Receive binder death callback"), notices + 2)
+        << "one notice line for each of the two deaths";
+}
+
+TEST_F(CrossProcessTest, DumpCountsTheWatchedProcesses) {
+    const auto watched = [this] {
+        const vyr_test::DumpResult dump = vyr_test::DumpOf(service_->asBinder().get(), {"--json"});
+        EXPECT_EQ(dump.status, STATUS_OK);
+        return nlohmann::json::parse(dump.text)["watched_processes"].get<int64_t>();
+    };
+    // Ends of earlier tests' clients are handled before this marker's.
+    auto marker = Vyrctl({"shell"});
+    const std::string m = OpenInShell(marker.get());
+    KillClient(marker.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(m), kWait));
+    const int64_t before = watched();
+    auto first = Vyrctl({"shell"});
+    auto second = Vyrctl({"shell"});
+    const std::string a = OpenInShell(first.get());
+    const std::string b = OpenInShell(second.get());
+    // One process using two handles is watched once.
+    const std::string a2 = OpenInShell(first.get());
+    ShellCommand(second.get(), "poll " + a);
+    EXPECT_EQ(watched(), before + 2);
+    KillClient(second.get());
+    ASSERT_TRUE(process_->WaitForLog(DiedLine(b), kWait));
+    EXPECT_EQ(watched(), before + 1) << "an ended process's descriptor is kept";
+    ShellCommand(first.get(), "close " + a);
+    EXPECT_EQ(watched(), before + 1) << "still the user of another handle";
+    ShellCommand(first.get(), "close " + a2);
+    EXPECT_EQ(watched(), before);
+}
+
 TEST_F(CrossProcessTest, ClientThatDisablesAndClosesFromItsCallbackLeavesTheServiceServing) {
     int32_t handle = 0;
     ASSERT_TRUE(service_->Open(kRange, &handle).isOk());

@@ -2,12 +2,16 @@
 // thread, which must neither join itself nor outlive the entry it reads.
 
 #include <android/log.h>
+#include <signal.h>
 
 #include <chrono>
 #include <future>
 #include <string>
+#include <thread>
 
+#include "child_process.h"
 #include "in_process_service.h"
+#include "temp_dir.h"
 #include "thread_count.h"
 
 namespace vyr_datapath {
@@ -124,6 +128,82 @@ TEST_F(NestedCallTest, EnableAfterANestedDisableStartsOneNewThread) {
     EXPECT_TRUE(vyr_test::WaitForThreadCount(idle_threads_ + 2, kWait))
         << "the processing thread and one notification thread";
     DisableNow(handle_);
+    EXPECT_TRUE(NotificationThreadEnded());
+}
+
+// A client released for its death while its OnEvent waits for the API lock (a nested call made
+// after the release took the lock): the release must not wait for that thread with the lock held.
+class DeathDuringNestedCallTest : public NestedCallTest {
+  protected:
+    // Enables the client, runs `prepare`, and at the client's first event has `cause_death` start
+    // its death, waits inside OnEvent until the service is releasing the client, then polls from
+    // OnEvent. Returns that poll's result.
+    int32_t PollFromOnEventDuringTheRelease(const std::function<void()>& prepare,
+                                            const std::function<void()>& cause_death) {
+        std::promise<void> ready;
+        std::shared_future<void> ready_future = ready.get_future().share();
+        std::promise<int32_t> nested;
+        std::future<int32_t> nested_result = nested.get_future();
+        callback_->SetReaction([&](size_t count) {
+            if (count != 1) return;
+            ready_future.wait();
+            cause_death();
+            // Logged with the API lock held, before the client's thread is stopped.
+            Logged(ANDROID_LOG_INFO, DiedLine());
+            Event event{};
+            int32_t result = 1;
+            service_->PollOnce(handle_, &event, &result);
+            nested.set_value(result);
+        });
+        EnableOk(handle_, 1);
+        prepare();
+        ready.set_value();
+        if (nested_result.wait_for(2 * kWait) != std::future_status::ready) {
+            ADD_FAILURE() << "the nested call never returned";
+            return 1;
+        }
+        return nested_result.get();
+    }
+    std::string DiedLine() {
+        return "client " + std::to_string(handle_) +
+               " mode 3 died; disable sensor and remove client handle";
+    }
+};
+
+TEST_F(DeathDuringNestedCallTest, ProcessEndReleasesWithoutWaitingForTheClientsThread) {
+    TempDir dir;
+    vyr_test::ChildProcess client({"/bin/sleep", "60"}, {}, dir.Path("stderr"));
+    ASSERT_TRUE(client.started());
+    const int32_t result = PollFromOnEventDuringTheRelease(
+        [this, &client] {
+            // After the test's own calls, which mark the handle as used by this process.
+            vyr_test::ServicePeer::SetOnlyClientProcess(*service_, handle_, client.pid());
+        },
+        [&client] {
+            client.Signal(SIGKILL);
+            client.Wait(kWait);
+        });
+    EXPECT_EQ(result, -22) << "the nested call ran after the release";
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_INFO, DiedLine()), 1u);
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_INFO, "Receive binder death callback"), 1u);
+    WaitForIdleWorkers();
+    EXPECT_TRUE(vyr_test::WaitForThreadCount(idle_threads_ + 1, kWait))
+        << "the notification thread ends; the process watcher's thread stays";
+}
+
+TEST_F(DeathDuringNestedCallTest, DeathNoticeReleasesWithoutWaitingForTheClientsThread) {
+    std::thread notice;
+    const int32_t result = PollFromOnEventDuringTheRelease(
+        [] {},
+        [this, &notice] {
+            notice = std::thread([this] {
+                vyr_test::ServicePeer::DeliverBinderDeath(*service_, callback_->asBinder().get());
+            });
+        });
+    notice.join();
+    EXPECT_EQ(result, -22) << "the nested call ran after the release";
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_INFO, DiedLine()), 1u);
+    WaitForIdleWorkers();
     EXPECT_TRUE(NotificationThreadEnded());
 }
 

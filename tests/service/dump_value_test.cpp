@@ -29,7 +29,7 @@ DumpValue Sample() {
 
 TEST(DumpValueTest, TextIndentsNestedValuesAndMarksListItems) {
     EXPECT_EQ(Sample().ToText(),
-              "name: a \"quoted\"\\path\n\n"
+              "name: a \"quoted\"\\path\\x0a\n"
               "count: -3\n"
               "on: yes\n"
               "unknown: -\n"
@@ -59,6 +59,41 @@ TEST(DumpValueTest, ControlCharactersAreEscapedInJson) {
     DumpValue root = DumpValue::Object();
     root.Set("raw", std::string("a\x01z", 3));
     EXPECT_EQ(root.ToJson(), "{\"raw\":\"a\\u0001z\"}");
+}
+
+// Bytes as a module path or a display state may hold them: UTF-8, and not.
+const std::string kMixed =
+    "caf\xc3\xa9 \xf0\x9f\x98\x80"  // well formed: kept
+    " \xff"                         // never a UTF-8 byte
+    " \xc3"                         // a sequence cut short
+    " \xc0\x80"                     // overlong form of NUL
+    " \xed\xa0\x80"                 // a surrogate
+    " \xf4\x90\x80\x80";            // above U+10FFFF
+
+TEST(DumpValueTest, JsonIsValidUtf8WhateverTheBytes) {
+    DumpValue root = DumpValue::Object();
+    root.Set("path", kMixed);
+    root.Set(std::string("key\xfe"), 1);
+    const std::string json = root.ToJson();
+    nlohmann::json parsed;
+    // nlohmann's parser rejects anything that is not UTF-8.
+    ASSERT_NO_THROW(parsed = nlohmann::json::parse(json)) << json;
+    const std::string replacement = "\xef\xbf\xbd";
+    EXPECT_EQ(parsed["path"], "caf\xc3\xa9 \xf0\x9f\x98\x80 " + replacement + " " + replacement +
+                                  " " + replacement + replacement + " " + replacement +
+                                  replacement + replacement + " " + replacement + replacement +
+                                  replacement + replacement);
+    EXPECT_EQ(parsed["key" + replacement], 1);
+}
+
+TEST(DumpValueTest, TextShowsBytesThatAreNotUtf8AndControlsAsEscapes) {
+    DumpValue root = DumpValue::Object();
+    root.Set("path", kMixed);
+    root.Set("state", std::string("On\tX\x7f", 5));
+    EXPECT_EQ(root.ToText(),
+              "path: caf\xc3\xa9 \xf0\x9f\x98\x80 \\xff \\xc3 \\xc0\\x80 \\xed\\xa0\\x80 "
+              "\\xf4\\x90\\x80\\x80\n"
+              "state: On\\x09X\\x7f\n");
 }
 
 }  // namespace

@@ -24,6 +24,18 @@ void VYRServiceTestPeer::PushWorkItem(VYRService& service, const WorkItem& item)
     service.QueueForMode(item.mode).PushAndSignal(item);
 }
 
+void VYRServiceTestPeer::SetOnlyClientProcess(VYRService& service, int32_t handle, pid_t pid) {
+    ApiLockGuard lock(service.api_lock_, std::chrono::seconds(10));
+    ClientEntry& entry = *service.clients_.at(handle);
+    entry.processes.clear();
+    entry.unwatched_user = false;
+    service.NoteProcess(&entry, pid);
+}
+
+void VYRServiceTestPeer::DeliverBinderDeath(VYRService& service, AIBinder* binder) {
+    service.HandleBinderDied(binder);
+}
+
 }  // namespace binder
 }  // namespace vyr
 }  // namespace android

@@ -1,7 +1,11 @@
 #pragma once
 
 // What tests may reach inside a VYRService that no binder method shows: a consistent copy of a
-// mode block's scheduling state, and a way to queue work items that no client sequence makes.
+// mode block's scheduling state, a way to queue work items that no client sequence makes, and
+// client deaths as another process would cause them.
+
+#include <android/binder_ibinder.h>
+#include <sys/types.h>
 
 #include <cstddef>
 #include <cstdint>
@@ -29,6 +33,11 @@ class VYRServiceTestPeer {
     // Queues an item for the worker of its mode, as the binder methods and the display monitor
     // do.
     static void PushWorkItem(VYRService& service, const WorkItem& item);
+    // Makes `pid` the only process that uses `handle`, as if that process had opened it and
+    // made every call on it: its end releases the handle.
+    static void SetOnlyClientProcess(VYRService& service, int32_t handle, pid_t pid);
+    // What a death notice for the callback binder `binder` does.
+    static void DeliverBinderDeath(VYRService& service, AIBinder* binder);
 };
 
 }  // namespace binder
