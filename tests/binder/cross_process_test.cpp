@@ -13,10 +13,12 @@
 #include <unistd.h>
 #include <vyr/binder_host.h>
 
+#include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <condition_variable>
 #include <cstring>
+#include <future>
 #include <map>
 #include <mutex>
 #include <string>
@@ -648,6 +650,107 @@ TEST_F(CrossProcessTest, WaitForServiceWaitsForTheName) {
     starter.join();
     ASSERT_NE(nullptr, binder.get());
     EXPECT_TRUE(AIBinder_isRemote(binder.get()));
+}
+
+TEST_F(CrossProcessTest, WaitForServiceWakesWhenTheServiceRegistersAgain) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> first = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, first);
+    Kill(pid);
+    ASSERT_TRUE(Eventually([&] { return !AIBinder_isAlive(first->asBinder().get()); }));
+    std::promise<ndk::SpAIBinder> found;
+    std::future<ndk::SpAIBinder> waited = found.get_future();
+    // Waits while the name is left only by a dead process.
+    std::thread waiter(
+        [&found] { found.set_value(ndk::SpAIBinder(AServiceManager_waitForService("vyr.test"))); });
+    Spawn("serve", "vyr.test");
+    ASSERT_EQ(std::future_status::ready, waited.wait_for(10s));
+    waiter.join();
+    ndk::SpAIBinder second = waited.get();
+    ASSERT_NE(nullptr, second.get());
+    EXPECT_NE(first->asBinder().get(), second.get());
+    EXPECT_TRUE(AIBinder_isAlive(second.get()));
+    EXPECT_EQ(STATUS_OK, AIBinder_ping(second.get()));
+}
+
+// The binders that registration notices reported.
+class Registrations {
+  public:
+    static void OnRegister(const char* instance, AIBinder* registered, void* cookie) {
+        auto* self = static_cast<Registrations*>(cookie);
+        std::lock_guard<std::mutex> lock(self->mutex_);
+        self->names_.push_back(instance);
+        AIBinder_incStrong(registered);
+        self->binders_.emplace_back(registered);
+        self->cv_.notify_all();
+    }
+    bool WaitFor(size_t count) {
+        std::unique_lock<std::mutex> lock(mutex_);
+        return cv_.wait_for(lock, 10s, [&] { return binders_.size() >= count; });
+    }
+    size_t Count() {
+        std::lock_guard<std::mutex> lock(mutex_);
+        return binders_.size();
+    }
+    ndk::SpAIBinder At(size_t index) {
+        std::lock_guard<std::mutex> lock(mutex_);
+        return binders_.at(index);
+    }
+    std::string NameAt(size_t index) {
+        std::lock_guard<std::mutex> lock(mutex_);
+        return names_.at(index);
+    }
+
+  private:
+    std::mutex mutex_;
+    std::condition_variable cv_;
+    std::vector<std::string> names_;
+    std::vector<ndk::SpAIBinder> binders_;
+};
+
+TEST_F(CrossProcessTest, RegistrationNoticesComeForEachNewRegistrationUntilDeleted) {
+    pid_t pid = -1;
+    ASSERT_NE(nullptr, StartServer("vyr.test", &pid));
+    Registrations seen;
+    AServiceManager_NotificationRegistration* registration =
+        AServiceManager_registerForServiceNotifications("vyr.test", &Registrations::OnRegister,
+                                                        &seen);
+    ASSERT_NE(nullptr, registration);
+    ASSERT_TRUE(seen.WaitFor(1)) << "the registration in place is reported";
+    EXPECT_EQ("vyr.test", seen.NameAt(0));
+    Kill(pid);
+    Spawn("serve", "vyr.test");
+    ASSERT_TRUE(seen.WaitFor(2)) << "a new registration is reported";
+    EXPECT_NE(seen.At(0).get(), seen.At(1).get());
+    EXPECT_EQ(STATUS_OK, AIBinder_ping(seen.At(1).get()));
+    AServiceManager_NotificationRegistration_delete(registration);
+    const size_t reported = seen.Count();
+    Kill(children_.back());
+    Spawn("serve", "vyr.test");
+    ASSERT_NE(nullptr, WaitForService("vyr.test").get());
+    EXPECT_EQ(reported, seen.Count()) << "a deleted registration reported a registration";
+    EXPECT_EQ(nullptr, AServiceManager_registerForServiceNotifications(
+                           "bad name", &Registrations::OnRegister, &seen));
+}
+
+TEST_F(CrossProcessTest, EveryProcessHoldingAServiceIsToldOfItsDeath) {
+    pid_t server = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &server);
+    ASSERT_NE(nullptr, service);
+    const pid_t watcher = Spawn("watch", "vyr.test");
+    const std::string marker = registry_.path() + "/vyr.test.linked." + std::to_string(watcher);
+    ASSERT_TRUE(Eventually([&] { return access(marker.c_str(), F_OK) == 0; }))
+        << "the other client never linked";
+    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
+    int cookie = 0;
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(service->asBinder().get(), recipient.get(), &cookie));
+    Kill(server);
+    EXPECT_TRUE(DeathLog::Get().WaitFor(1));
+    int status = -1;
+    ASSERT_TRUE(Eventually([&] { return waitpid(watcher, &status, WNOHANG) == watcher; }))
+        << "the other client was not told";
+    children_.erase(std::find(children_.begin(), children_.end(), watcher));
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << status;
 }
 
 TEST_F(CrossProcessTest, NamesOfDeadProcessesAreReplacedAndLiveOnesKept) {

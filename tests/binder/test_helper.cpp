@@ -4,11 +4,16 @@
 //   binder_test_helper client <name>           hands a RecordingCallback to <name> and waits
 //   binder_test_helper nopool <name>           without a thread pool: exits 0 when calls nested
 //                                              in its own call arrive and others do not
+//   binder_test_helper watch <name>            links to the death of <name>, then creates
+//                                              <name>.linked.<pid> in VYR_BINDER_DIR; exits 0
+//                                              when the death notice comes
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <string>
 
@@ -58,12 +63,32 @@ int NoPool(const std::string& name) {
     return callback->events().size() == 2 ? 0 : 5;
 }
 
+void ExitOnDeath(void* /*cookie*/) {
+    _exit(0);
+}
+
+int Watch(const std::string& name) {
+    ABinderProcess_startThreadPool();
+    ndk::SpAIBinder binder(AServiceManager_getService(name.c_str()));
+    if (binder.get() == nullptr) return 2;
+    AIBinder_DeathRecipient* recipient = AIBinder_DeathRecipient_new(&ExitOnDeath);
+    if (AIBinder_linkToDeath(binder.get(), recipient, nullptr) != STATUS_OK) return 3;
+    const char* dir = getenv("VYR_BINDER_DIR");
+    const std::string marker = std::string(dir != nullptr ? dir : "/tmp") + "/" + name +
+                               ".linked." + std::to_string(getpid());
+    int fd = open(marker.c_str(), O_CREAT | O_WRONLY | O_CLOEXEC, 0600);
+    if (fd < 0) return 4;
+    close(fd);
+    for (;;) pause();
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
     if (argc == 3 && strcmp(argv[1], "nopool") == 0) return NoPool(argv[2]);
-    fprintf(stderr, "usage: %s serve|client|nopool <name>\n", argv[0]);
+    if (argc == 3 && strcmp(argv[1], "watch") == 0) return Watch(argv[2]);
+    fprintf(stderr, "usage: %s serve|client|nopool|watch <name>\n", argv[0]);
     return 64;
 }

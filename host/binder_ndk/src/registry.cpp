@@ -18,12 +18,7 @@ namespace {
 constexpr size_t kMaxNameBytes = 127;
 
 std::string EntryPath(const std::string& dir, const std::string& name) {
-    // '/' may appear in names but not in file names; '@' may not appear in names.
-    std::string file = "svc." + name;
-    for (char& c : file) {
-        if (c == '/') c = '@';
-    }
-    return dir + "/" + file;
+    return dir + "/" + Registry::EntryFileName(name);
 }
 
 bool ReadKey(const std::string& entry, std::string* key) {
@@ -78,6 +73,15 @@ bool Registry::Dir(std::string* dir) {
         return false;
     }
     return true;
+}
+
+std::string Registry::EntryFileName(const std::string& name) {
+    // '/' may appear in names but not in file names; '@' may not appear in names.
+    std::string file = "svc." + name;
+    for (char& c : file) {
+        if (c == '/') c = '@';
+    }
+    return file;
 }
 
 bool Registry::IsValidName(const std::string& name) {

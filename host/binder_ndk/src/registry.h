@@ -15,6 +15,8 @@ class Registry {
     static bool Dir(std::string* dir);
     static bool IsValidName(const std::string& name);
 
+    // The file, inside the directory, that names the owner of `name`.
+    static std::string EntryFileName(const std::string& name);
     static std::string SocketPath(const std::string& dir, const std::string& key);
     static std::string LockPath(const std::string& dir, const std::string& key);
 

@@ -1,8 +1,9 @@
 #include <android/binder_manager.h>
 
 #include <chrono>
+#include <condition_variable>
+#include <mutex>
 #include <string>
-#include <thread>
 
 #include "process_state.h"
 #include "registry.h"
@@ -22,17 +23,41 @@ AIBinder* Released(ndk::SpAIBinder binder) {
     return raw;
 }
 
+// The first binder reported for a name.
+struct Waiter {
+    static void OnRegister(const char* /*instance*/, AIBinder* registered, void* cookie) {
+        auto* waiter = static_cast<Waiter*>(cookie);
+        std::lock_guard<std::mutex> lock(waiter->mutex);
+        if (waiter->binder.get() != nullptr) return;
+        AIBinder_incStrong(registered);
+        waiter->binder.set(registered);
+        waiter->found.notify_all();
+    }
+    std::mutex mutex;
+    std::condition_variable found;
+    ndk::SpAIBinder binder;
+};
+
+// Woken by the registration itself rather than by looking again and again.
 AIBinder* LookupUntil(const char* instance, bool forever) {
     if (instance == nullptr || !Registry::IsValidName(instance)) return nullptr;
-    auto deadline = std::chrono::steady_clock::now() + kGetServiceWait;
-    std::chrono::milliseconds pause(1);
-    for (;;) {
-        ndk::SpAIBinder binder = ProcessState::Get().Lookup(instance);
-        if (binder.get() != nullptr) return Released(binder);
-        if (!forever && std::chrono::steady_clock::now() >= deadline) return nullptr;
-        std::this_thread::sleep_for(pause);
-        if (pause < std::chrono::milliseconds(50)) pause *= 2;
+    Waiter waiter;
+    AServiceManager_NotificationRegistration* registration =
+        AServiceManager_registerForServiceNotifications(instance, &Waiter::OnRegister, &waiter);
+    if (registration == nullptr) return nullptr;
+    ndk::SpAIBinder binder;
+    {
+        std::unique_lock<std::mutex> lock(waiter.mutex);
+        const auto found = [&waiter] { return waiter.binder.get() != nullptr; };
+        if (forever) {
+            waiter.found.wait(lock, found);
+        } else {
+            waiter.found.wait_for(lock, kGetServiceWait, found);
+        }
+        binder = waiter.binder;
     }
+    AServiceManager_NotificationRegistration_delete(registration);
+    return binder.get() != nullptr ? Released(binder) : nullptr;
 }
 
 }  // namespace
