@@ -148,6 +148,8 @@ bool ParseStreamOptions(const std::vector<std::string>& args, StreamOptions* opt
             options->low_power = true;
         } else if (arg == "--json") {
             options->json = true;
+        } else if (arg == "--no-reconnect") {
+            options->reconnect = false;
         } else {
             *error = "unknown stream option '" + arg + "'";
             return false;
@@ -186,8 +188,10 @@ std::string UsageText() {
            "  shell                      read commands from stdin, one result line each "
            "('help' lists them)\n"
            "  stream als|range [--period MS] [--callback|--poll] [--count N | --seconds S]\n"
-           "         [--low-power] [--json]\n"
-           "                             print each event of one sensor until done or Ctrl-C\n"
+           "         [--low-power] [--json] [--no-reconnect]\n"
+           "                             print each event of one sensor until done or Ctrl-C;\n"
+           "                             carries on across restarts of the service unless\n"
+           "                             --no-reconnect\n"
            "  configure V0 ... V10       send eleven control values to the range sensor\n"
            "  torch STATE                tell the light sensor the camera torch state\n"
            "  dump [--json]              the service's state: sensors, modes, clients, queues,\n"

@@ -35,6 +35,8 @@ struct StreamOptions {
     std::optional<double> seconds;
     bool low_power = false;
     bool json = false;
+    // Re-attach when the service restarts; false: end with an error.
+    bool reconnect = true;
 };
 
 struct DemoViewOptions {

@@ -186,7 +186,7 @@ void Shell::Callback(const Args& args) {
     int32_t handle = n[0];
     Connection::StartThreadPool();
     LineWriter* out = out_;
-    auto callback = ndk::SharedRefBase::make<ForwardingCallback>([out, handle](const Event& e) {
+    auto callback = ndk::SharedRefBase::make<vyr::EventSink>([out, handle](const Event& e) {
         out->WriteLine("event " + std::to_string(handle) + " " + FormatEventRaw(e));
     });
     int32_t result = 0;

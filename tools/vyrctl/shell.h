@@ -3,6 +3,7 @@
 // `vyrctl shell`: one IVYRService call per input line, one result line per command.
 
 #include <aidl/android/vyr/IVYRService.h>
+#include <vyr/event_sink.h>
 
 #include <cstdint>
 #include <map>
@@ -10,7 +11,6 @@
 #include <string>
 #include <vector>
 
-#include "forwarding_callback.h"
 #include "line_writer.h"
 
 namespace vyrctl {
@@ -59,7 +59,7 @@ class Shell {
     LineWriter* err_;
     std::map<int32_t, OpenClient> open_clients_;
     // Registered callbacks stay alive for the session: the service may still call them.
-    std::vector<std::shared_ptr<ForwardingCallback>> callbacks_;
+    std::vector<std::shared_ptr<vyr::EventSink>> callbacks_;
 };
 
 }  // namespace vyrctl

@@ -1,82 +1,102 @@
 #include "stream_command.h"
 
-#include <algorithm>
+#include <vyr/sensor_client.h>
 
-#include "call_check.h"
+#include <algorithm>
+#include <atomic>
+
 #include "event_format.h"
 #include "event_queue.h"
-#include "forwarding_callback.h"
 #include "result_text.h"
 #include "stop_signal.h"
 
 namespace vyrctl {
 
 using aidl::android::vyr::Event;
-using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
+using vyr::SensorClient;
 
 namespace {
 
 constexpr milliseconds kWaitSlice{50};
 
-class Stream {
+class Stream : public vyr::SensorClientListener {
   public:
     Stream(const Connection& connection, const StreamOptions& options, LineWriter* out,
            LineWriter* err)
-        : connection_(connection),
-          service_(connection.service()),
-          options_(options),
-          out_(out),
-          err_(err) {}
+        : connection_(connection), options_(options), out_(out), err_(err) {}
 
     int Run() {
-        std::string what = std::string("open ") + ModeName(options_.mode);
-        int32_t result = 0;
-        // Each call runs before its result is read: argument order is unspecified.
-        ndk::ScopedAStatus status = service_->Open(options_.mode, &result);
-        if (!CheckCall(status, result, what, err_)) return 1;
-        handle_ = result;
-        int exit_status = Setup() ? Loop() : 1;
-        Teardown();
+        // The service's death notice arrives on the pool, as callback events do.
+        Connection::StartThreadPool();
+        vyr::SensorSettings settings;
+        settings.mode = options_.mode;
+        settings.period_ms = options_.period_ms;
+        settings.use_callback = options_.use_callback;
+        if (options_.low_power) settings.low_power = true;
+        vyr::ReattachPolicy policy;
+        policy.reattach = options_.reconnect;
+        SensorClient client(settings, this, policy);
+        client_ = &client;
+        const int32_t result = client.Start(connection_.service());
+        if (result != 0) {
+            err_->WriteLine(std::string("error: open ") + ModeName(options_.mode) + " -> " +
+                            DescribeResult(result));
+            return 1;
+        }
+        err_->WriteLine(std::string("streaming ") + ModeName(options_.mode) + " (handle " +
+                        std::to_string(client.handle()) + ", every " +
+                        std::to_string(options_.period_ms) + " ms, " +
+                        (options_.use_callback ? "callback" : "poll") + "); Ctrl-C to stop");
+        const int exit_status = Loop();
+        const int32_t handle = client.handle();
+        client.Stop();
+        if (handle != 0) {
+            err_->WriteLine("stopped after " + std::to_string(printed_) + " events; handle " +
+                            std::to_string(handle) + " disabled and closed");
+        }
         return exit_status;
     }
 
-  private:
-    bool Setup() {
-        int32_t result = 0;
-        if (options_.low_power) {
-            // A refusal (range handles) is worth a warning, not the end of the stream.
-            ndk::ScopedAStatus status = service_->EnableLowPower(handle_, true, &result);
-            if (status.isOk() && result != 0) {
-                err_->WriteLine("warning: lowpower -> " + DescribeResult(result) +
-                                " (only the light sensor has a low-power mode); going on without");
-            } else if (!status.isOk()) {
-                err_->WriteLine("warning: lowpower: " + DescribeStatus(status));
-            }
+    void OnEvent(const Event& event) override { queue_.Push(event); }
+
+    void OnServiceLost(int32_t handle) override {
+        if (!options_.reconnect) {
+            err_->WriteLine("error: vyrservice died");
+            ended_ = true;
+            return;
         }
-        if (options_.use_callback) {
-            Connection::StartThreadPool();
-            EventQueue* queue = &queue_;
-            callback_ = ndk::SharedRefBase::make<ForwardingCallback>(
-                [queue](const Event& event) { queue->Push(event); });
-            ndk::ScopedAStatus status = service_->SetCallback(handle_, callback_, &result);
-            if (!CheckCall(status, result, "callback", err_)) {
-                return false;
-            }
-        }
-        ndk::ScopedAStatus status = service_->Enable(handle_, options_.period_ms, &result);
-        if (!CheckCall(status, result, "enable", err_)) {
-            return false;
-        }
-        enabled_ = true;
-        err_->WriteLine(std::string("streaming ") + ModeName(options_.mode) + " (handle " +
-                        std::to_string(handle_) + ", every " + std::to_string(options_.period_ms) +
-                        " ms, " + (options_.use_callback ? "callback" : "poll") +
-                        "); Ctrl-C to stop");
-        return true;
+        err_->WriteLine("service lost (handle " + std::to_string(handle) +
+                        "); waiting for it to start again");
     }
 
+    void OnOpenRefused(int32_t result, int attempt, milliseconds retry_in) override {
+        err_->WriteLine("open -> " + DescribeResult(result) + "; trying again in " +
+                        std::to_string(retry_in.count()) + " ms (attempt " +
+                        std::to_string(attempt) + ")");
+    }
+
+    void OnResumed(int32_t old_handle, int32_t new_handle, milliseconds since_last) override {
+        err_->WriteLine("service restarted: handle " + std::to_string(old_handle) + " -> " +
+                        std::to_string(new_handle) + ", " + std::to_string(since_last.count()) +
+                        " ms without events");
+    }
+
+    void OnGaveUp(const std::string& reason) override {
+        err_->WriteLine("error: gave up re-attaching to vyrservice: " + reason);
+        ended_ = true;
+    }
+
+    void OnSettingRefused(const std::string& setting, int32_t result) override {
+        // A refusal (range handles have no low-power mode) is worth a warning, not the end.
+        err_->WriteLine("warning: " + setting + " -> " + DescribeResult(result) +
+                        (setting == "low power"
+                             ? " (only the light sensor has a low-power mode); going on without"
+                             : "; going on without"));
+    }
+
+  private:
     int Loop() {
         auto start = steady_clock::now();
         std::optional<steady_clock::time_point> end;
@@ -87,25 +107,16 @@ class Stream {
         // Polling faster than the period catches every sample of the sensor once.
         milliseconds poll_interval(std::max(1, options_.period_ms / 2));
         while (!Done(end)) {
-            if (!connection_.IsAlive()) {
-                err_->WriteLine("error: vyrservice died");
-                dead_ = true;
-                return 1;
-            }
+            if (ended_) return 1;
             if (options_.use_callback) {
                 if (std::optional<Event> event = queue_.Pop(kWaitSlice)) Print(*event);
                 continue;
             }
             Event event{};
-            int32_t result = 0;
-            ndk::ScopedAStatus status = service_->PollOnce(handle_, &event, &result);
-            if (!status.isOk()) {
-                err_->WriteLine("error: poll: " + DescribeStatus(status));
-                return 1;
-            }
+            const int32_t result = client_->Poll(&event);
             if (result == 0) {
                 Print(event);
-            } else if (result != -61) {
+            } else if (result != -61 && result != SensorClient::kNotAttached) {
                 err_->WriteLine("error: poll -> " + DescribeResult(result));
                 return 1;
             }
@@ -128,29 +139,19 @@ class Stream {
     void Print(const Event& event) {
         if (options_.count && printed_ >= *options_.count) return;
         ++printed_;
-        out_->WriteLine(options_.json ? FormatEventJson(options_.mode, handle_, event)
+        out_->WriteLine(options_.json ? FormatEventJson(options_.mode, client_->handle(), event)
                                       : FormatEventReadable(options_.mode, event));
     }
 
-    void Teardown() {
-        if (dead_) return;
-        if (enabled_) service_->Disable(handle_);
-        service_->Close(handle_);
-        err_->WriteLine("stopped after " + std::to_string(printed_) + " events; handle " +
-                        std::to_string(handle_) + " disabled and closed");
-    }
-
     const Connection& connection_;
-    std::shared_ptr<IVYRService> service_;
     const StreamOptions& options_;
     LineWriter* out_;
     LineWriter* err_;
-    int32_t handle_ = 0;
-    bool enabled_ = false;
-    bool dead_ = false;
+    SensorClient* client_ = nullptr;
+    // Set on the client's thread: the service is gone for good.
+    std::atomic<bool> ended_{false};
     int64_t printed_ = 0;
     EventQueue queue_;
-    std::shared_ptr<ForwardingCallback> callback_;
 };
 
 }  // namespace

@@ -1,18 +1,18 @@
 #pragma once
 
-// An IEventCallback that hands each event to a function; it runs on a binder thread.
+// An IEventCallback that hands each event to a function, on the binder thread that delivers it.
 
 #include <aidl/android/vyr/BnEventCallback.h>
 
 #include <functional>
 
-namespace vyrctl {
+namespace vyr {
 
-class ForwardingCallback : public aidl::android::vyr::BnEventCallback {
+class EventSink : public aidl::android::vyr::BnEventCallback {
   public:
     using Sink = std::function<void(const aidl::android::vyr::Event&)>;
 
-    explicit ForwardingCallback(Sink sink) : sink_(std::move(sink)) {}
+    explicit EventSink(Sink sink) : sink_(std::move(sink)) {}
 
     ndk::ScopedAStatus OnEvent(const aidl::android::vyr::Event& event) override;
 
@@ -20,4 +20,4 @@ class ForwardingCallback : public aidl::android::vyr::BnEventCallback {
     const Sink sink_;
 };
 
-}  // namespace vyrctl
+}  // namespace vyr

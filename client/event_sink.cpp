@@ -1,0 +1,10 @@
+#include "vyr/event_sink.h"
+
+namespace vyr {
+
+ndk::ScopedAStatus EventSink::OnEvent(const aidl::android::vyr::Event& event) {
+    sink_(event);
+    return ndk::ScopedAStatus::ok();
+}
+
+}  // namespace vyr
