@@ -2,11 +2,15 @@
 #include <signal.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <memory>
+#include <thread>
 
+#include "child_process.h"
 #include "sandboxed_service.h"
 #include "shell_client.h"
+#include "test_files.h"
 
 namespace vyr_e2e {
 namespace {
@@ -184,6 +188,37 @@ TEST_F(E2eTest, CameraHalApexChangeRestartsTheProcess) {
         last_modified = i;
     }
     EXPECT_GT(FindRecord(log, "vyrservice_main", 'I', kRestarting), last_modified);
+}
+
+TEST_F(E2eTest, UnderAnInitLikeRestartAStreamGoesOnAcrossTheApexUpdate) {
+    SandboxedService::Options options{"Off", {}, ApexList(1, 5)};
+    options.restart = true;
+    auto service = Start(options);
+    if (service == nullptr) return;
+    const pid_t first_pid = service->service_pid();
+    const std::string stream_errors = service->dir() + "/stream.err";
+    vyr_test::ChildProcess stream({VYRCTL_PATH, "stream", "range", "--callback", "--period", "100"},
+                                  service->ClientEnvironment(), stream_errors);
+    ASSERT_TRUE(stream.ReadLine(20s)) << vyr_test::ReadFile(stream_errors);
+
+    ASSERT_TRUE(service->WriteApexList(ApexList(2, 5)));
+    const std::optional<int> status = service->WaitForExit(kWait);
+    ASSERT_TRUE(status);
+    EXPECT_EQ(0, *status);
+    const std::optional<pid_t> second_pid = service->WaitForRestart(kWait);
+    ASSERT_TRUE(second_pid) << "the sandbox did not start the service again";
+    EXPECT_NE(*second_pid, first_pid);
+    // The stream resumes on the new instance and says so.
+    const auto deadline = std::chrono::steady_clock::now() + 30s;
+    while (vyr_test::ReadFile(stream_errors).find("service restarted: handle ") ==
+           std::string::npos) {
+        ASSERT_LT(std::chrono::steady_clock::now(), deadline) << vyr_test::ReadFile(stream_errors);
+        std::this_thread::sleep_for(20ms);
+    }
+    while (stream.ReadLine(0ms)) {
+    }
+    EXPECT_TRUE(stream.ReadLine(kWait)) << "no event from the new instance";
+    EXPECT_TRUE(stream.Running());
 }
 
 TEST_F(E2eTest, AmbientLightPropertyOffMeansNoDisplayMonitorAndDeadClientsAreSwitchedOff) {

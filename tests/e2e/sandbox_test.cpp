@@ -1,8 +1,10 @@
 #include <gtest/gtest.h>
+#include <signal.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <fstream>
 #include <map>
@@ -51,13 +53,16 @@ class SandboxTest : public ::testing::Test {
     }
 
     // Starts the sandbox on `script`; true once it reported the command's pid.
-    bool Start(const std::string& script, const std::vector<std::string>& prefix = {}) {
+    bool Start(const std::string& script, const std::vector<std::string>& prefix = {},
+               const std::vector<std::string>& options = {}) {
         std::vector<std::string> argv = prefix;
+        argv.push_back(VYR_SANDBOX_PATH);
+        argv.push_back("run");
+        argv.insert(argv.end(), options.begin(), options.end());
         for (const std::string& arg :
-             {std::string(VYR_SANDBOX_PATH), std::string("run"), std::string("--panel"),
-              std::string("Off"), std::string("--apex"), dir_ + "/apex-info-list.xml",
-              std::string("--props"), dir_ + "/build.prop", std::string("--"),
-              std::string("/bin/sh"), std::string("-c"), script}) {
+             {std::string("--panel"), std::string("Off"), std::string("--apex"),
+              dir_ + "/apex-info-list.xml", std::string("--props"), dir_ + "/build.prop",
+              std::string("--"), std::string("/bin/sh"), std::string("-c"), script}) {
             argv.push_back(arg);
         }
         sandbox_ = std::make_unique<vyr_test::ChildProcess>(
@@ -128,6 +133,31 @@ TEST_F(SandboxTest, QuitAndEndOfInputEndTheCommand) {
     ASSERT_TRUE(Start("sleep 60"));
     sandbox_->CloseStdin();
     EXPECT_EQ("exit 143", sandbox_->ReadLine(kWait));
+}
+
+TEST_F(SandboxTest, RestartStartsTheCommandAgainAsInitDoes) {
+    // Before the first start, so that the interval measured is never shorter than the real one.
+    const auto first_start = std::chrono::steady_clock::now();
+    ASSERT_TRUE(Start("exit 3", {}, {"--restart"}));
+    EXPECT_EQ(sandbox_->ReadLine(kWait), "exit 3");
+    // init's restart period: the next start comes 5 s after the last one at the earliest.
+    const auto again = sandbox_->ReadLine(kWait);
+    ASSERT_TRUE(again && again->rfind("pid ", 0) == 0) << again.value_or("(nothing)");
+    EXPECT_GE(std::chrono::steady_clock::now() - first_start, 5s);
+    EXPECT_EQ(sandbox_->ReadLine(kWait), "exit 3");
+    sandbox_->Signal(SIGTERM);
+    const auto status = sandbox_->Wait(kWait);
+    ASSERT_TRUE(status) << "SIGTERM did not end the restarting sandbox";
+    EXPECT_TRUE(WIFEXITED(*status) && WEXITSTATUS(*status) == 3);
+}
+
+TEST_F(SandboxTest, RestartEndsARunningCommandWhenAskedTo) {
+    ASSERT_TRUE(Start("sleep 60", {}, {"--restart"}));
+    ASSERT_TRUE(sandbox_->WriteLine("quit"));
+    EXPECT_EQ(sandbox_->ReadLine(kWait), "exit 143");
+    const auto status = sandbox_->Wait(kWait);
+    ASSERT_TRUE(status);
+    EXPECT_TRUE(WIFEXITED(*status) && WEXITSTATUS(*status) == 143);
 }
 
 TEST_F(SandboxTest, ExitsWith77WithoutPrivilege) {

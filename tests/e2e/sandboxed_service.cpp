@@ -57,11 +57,14 @@ SandboxedService::SandboxedService(const Options& options) {
     WriteFile(dir_ + "/apex-info-list.xml", options.apex_list);
 
     started_at_ = std::chrono::steady_clock::now();
-    sandbox_ = std::make_unique<vyr_test::ChildProcess>(
-        std::vector<std::string>{VYR_SANDBOX_PATH, "run", "--panel", options.panel, "--apex",
-                                 dir_ + "/apex-info-list.xml", "--props", dir_ + "/build.prop",
-                                 "--", VYRSERVICE_PATH},
-        ClientEnvironment(), dir_ + "/service.log");
+    std::vector<std::string> argv = {VYR_SANDBOX_PATH, "run",
+                                     "--panel",        options.panel,
+                                     "--apex",         dir_ + "/apex-info-list.xml",
+                                     "--props",        dir_ + "/build.prop"};
+    if (options.restart) argv.push_back("--restart");
+    argv.insert(argv.end(), {"--", VYRSERVICE_PATH});
+    sandbox_ =
+        std::make_unique<vyr_test::ChildProcess>(argv, ClientEnvironment(), dir_ + "/service.log");
     const std::optional<std::string> first = sandbox_->ReadLine(kStartTimeout);
     if (first && first->rfind("pid ", 0) == 0) {
         service_pid_ = std::stoi(first->substr(4));
@@ -187,6 +190,14 @@ std::optional<int> SandboxedService::WaitForExit(std::chrono::milliseconds timeo
     if (!line || line->rfind("exit ", 0) != 0) return std::nullopt;
     exit_status_ = std::stoi(line->substr(5));
     return exit_status_;
+}
+
+std::optional<pid_t> SandboxedService::WaitForRestart(std::chrono::milliseconds timeout) {
+    const std::optional<std::string> line = sandbox_->ReadLine(timeout);
+    if (!line || line->rfind("pid ", 0) != 0) return std::nullopt;
+    exit_status_.reset();
+    service_pid_ = std::stoi(line->substr(4));
+    return service_pid_;
 }
 
 }  // namespace vyr_e2e

@@ -23,6 +23,8 @@ class SandboxedService {
         std::string panel = "Off";
         std::map<std::string, std::string> properties;
         std::string apex_list;
+        // The sandbox starts the service again after each exit, as init does.
+        bool restart = false;
     };
 
     explicit SandboxedService(const Options& options);
@@ -55,6 +57,8 @@ class SandboxedService {
 
     // The service's exit status as the sandbox forwards it (code, or 128 + signal).
     std::optional<int> WaitForExit(std::chrono::milliseconds timeout);
+    // With `restart`: the pid of the next start, after the exit has been read.
+    std::optional<pid_t> WaitForRestart(std::chrono::milliseconds timeout);
 
   private:
     std::string dir_;

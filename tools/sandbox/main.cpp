@@ -1,7 +1,8 @@
 // vyr-sandbox: runs the unmodified service binary with the device paths it expects, backed by
 // things the caller controls.
 //
-//   vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] [--no-stdin] -- COMMAND [ARG...]
+//   vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] [--no-stdin] [--restart]
+//                   -- COMMAND [ARG...]
 //   vyr-sandbox panel PID STATE
 //
 // `run` starts COMMAND in private mount and UTS namespaces in which
@@ -19,6 +20,11 @@
 // killed it. The command's stdout is sent to stderr so that stdout carries only the lines above.
 // Statuses of its own: 77 without the privilege to create namespaces, 125 when setting up fails,
 // 127 when COMMAND cannot be run.
+//
+// With --restart the sandbox starts the command again after each exit, as init does for a
+// service that is not oneshot: no sooner than 5 s after its last start. It prints "exit S" for
+// each exit and "pid N" for each start, and ends (with the last status) only when asked to:
+// SIGTERM, SIGINT, SIGHUP, quit or end of stdin.
 //
 // `panel` sets the state of the sandbox that contains process PID (the sandbox or its command).
 //
@@ -42,8 +48,8 @@ constexpr char kApexListName[] = "apex-info-list.xml";
 
 int Usage() {
     fprintf(stderr,
-            "usage: vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] [--no-stdin] -- "
-            "COMMAND [ARG...]\n"
+            "usage: vyr-sandbox run [--panel STATE] [--apex FILE] [--props FILE] [--no-stdin] "
+            "[--restart] -- COMMAND [ARG...]\n"
             "       vyr-sandbox panel PID STATE\n");
     return 2;
 }
@@ -69,6 +75,11 @@ int Run(int argc, char** argv) {
     for (; i < argc && strcmp(argv[i], "--") != 0; i += 2) {
         if (strcmp(argv[i], "--no-stdin") == 0) {
             options.read_stdin = false;
+            --i;
+            continue;
+        }
+        if (strcmp(argv[i], "--restart") == 0) {
+            options.restart = true;
             --i;
             continue;
         }

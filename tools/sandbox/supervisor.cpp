@@ -21,6 +21,9 @@ namespace vyr_sandbox {
 namespace {
 
 constexpr auto kTermGrace = std::chrono::seconds(5);
+// init's default restart period: a service is started again no sooner than this after its last
+// start.
+constexpr auto kRestartPeriod = std::chrono::seconds(5);
 
 void Say(const std::string& line) {
     std::string text = line + "\n";
@@ -86,15 +89,26 @@ int Supervisor::Run() {
         Complain(std::string("signalfd: ") + strerror(errno));
         return kExitSetupFailed;
     }
-    child_ = StartCommand();
-    if (child_ < 0) {
-        close(signal_fd);
-        return kExitSetupFailed;
+    int status = 0;
+    while (true) {
+        const auto started = std::chrono::steady_clock::now();
+        child_ = StartCommand();
+        if (child_ < 0) {
+            status = kExitSetupFailed;
+            break;
+        }
+        Say("pid " + std::to_string(child_));
+        if (Wait(signal_fd, std::nullopt, &status) == Wake::kStop) {
+            status = Terminate(signal_fd);
+            Say("exit " + std::to_string(status));
+            break;
+        }
+        Say("exit " + std::to_string(status));
+        if (!options_.restart || Wait(signal_fd, started + kRestartPeriod, &status) == Wake::kStop) {
+            break;
+        }
     }
-    Say("pid " + std::to_string(child_));
-    int status = WaitForCommand(signal_fd);
     close(signal_fd);
-    Say("exit " + std::to_string(status));
     return status;
 }
 
@@ -140,35 +154,47 @@ bool Supervisor::HandleLine(const std::string& line) {
     return true;
 }
 
-int Supervisor::WaitForCommand(int signal_fd) {
-    std::string pending;
-    bool stdin_open = options_.read_stdin;
+Supervisor::Wake Supervisor::Wait(int signal_fd,
+                                  std::optional<std::chrono::steady_clock::time_point> deadline,
+                                  int* status) {
     while (true) {
+        int timeout_ms = -1;
+        if (deadline) {
+            const auto left = std::chrono::ceil<std::chrono::milliseconds>(
+                *deadline - std::chrono::steady_clock::now());
+            if (left.count() <= 0) return Wake::kTimeout;
+            timeout_ms = static_cast<int>(left.count());
+        }
         pollfd fds[2] = {{signal_fd, POLLIN, 0}, {STDIN_FILENO, POLLIN, 0}};
-        if (poll(fds, stdin_open ? 2 : 1, -1) < 0) {
+        const int ready = poll(fds, stdin_open_ ? 2 : 1, timeout_ms);
+        if (ready < 0) {
             if (errno == EINTR) continue;
-            return Terminate(signal_fd);
+            return Wake::kStop;
         }
         if (fds[0].revents & POLLIN) {
             signalfd_siginfo info;
             if (read(signal_fd, &info, sizeof(info)) == sizeof(info) && info.ssi_signo != SIGCHLD) {
-                return Terminate(signal_fd);
+                return Wake::kStop;
             }
             int wait_status;
-            if (waitpid(child_, &wait_status, WNOHANG) == child_) return StatusOf(wait_status);
+            if (child_ > 0 && waitpid(child_, &wait_status, WNOHANG) == child_) {
+                child_ = -1;
+                *status = StatusOf(wait_status);
+                return Wake::kCommandEnded;
+            }
         }
-        if (stdin_open && (fds[1].revents & (POLLIN | POLLHUP | POLLERR))) {
+        if (stdin_open_ && (fds[1].revents & (POLLIN | POLLHUP | POLLERR))) {
             char buffer[512];
             ssize_t got = read(STDIN_FILENO, buffer, sizeof(buffer));
             if (got < 0 && errno == EINTR) continue;
             // The controller went away: nobody is left to end the command, so end it now.
-            if (got <= 0) return Terminate(signal_fd);
-            pending.append(buffer, got);
+            if (got <= 0) return Wake::kStop;
+            pending_.append(buffer, got);
             size_t end;
-            while ((end = pending.find('\n')) != std::string::npos) {
-                std::string line = pending.substr(0, end);
-                pending.erase(0, end + 1);
-                if (!HandleLine(line)) return Terminate(signal_fd);
+            while ((end = pending_.find('\n')) != std::string::npos) {
+                std::string line = pending_.substr(0, end);
+                pending_.erase(0, end + 1);
+                if (!HandleLine(line)) return Wake::kStop;
             }
         }
     }
@@ -176,6 +202,7 @@ int Supervisor::WaitForCommand(int signal_fd) {
 
 int Supervisor::Terminate(int signal_fd) {
     int wait_status;
+    if (child_ < 0) return 0;
     if (waitpid(child_, &wait_status, WNOHANG) == child_) return StatusOf(wait_status);
     kill(child_, SIGTERM);
     const auto deadline = std::chrono::steady_clock::now() + kTermGrace;
