@@ -58,6 +58,7 @@ void SensorClient::Core::Stop() {
     if (thread_.joinable()) thread_.join();
     {
         std::unique_lock<std::mutex> lock(mutex_);
+        android::base::ScopedLockAssertion locked(mutex_);
         changed_.wait(lock, [this]() REQUIRES(mutex_) { return delivering_ == 0; });
     }
     Release();
@@ -183,6 +184,7 @@ void SensorClient::Core::Supervise() {
         ndk::SpAIBinder dead;
         {
             std::unique_lock<std::mutex> lock(mutex_);
+            android::base::ScopedLockAssertion locked(mutex_);
             changed_.wait(lock, [this]() REQUIRES(mutex_) { return stopping_ || lost_; });
             if (stopping_) return;
             old_handle = handle_;
@@ -209,6 +211,7 @@ bool SensorClient::Core::Reattach(int32_t old_handle, const ndk::SpAIBinder& dea
         ndk::SpAIBinder binder;
         {
             std::unique_lock<std::mutex> lock(mutex_);
+            android::base::ScopedLockAssertion locked(mutex_);
             changed_.wait(lock, [this, &dead]() REQUIRES(mutex_) {
                 return stopping_ ||
                        (registered_.get() != nullptr && registered_.get() != dead.get());
@@ -243,6 +246,7 @@ bool SensorClient::Core::Reattach(int32_t old_handle, const ndk::SpAIBinder& dea
         listener_->OnOpenRefused(attempt.result, refusals, delay);
         {
             std::unique_lock<std::mutex> lock(mutex_);
+            android::base::ScopedLockAssertion locked(mutex_);
             if (changed_.wait_for(lock, delay, [this]() REQUIRES(mutex_) { return stopping_; })) {
                 break;
             }

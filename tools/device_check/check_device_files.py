@@ -8,7 +8,8 @@
 - every path in file_contexts and genfs_contexts is the installed binary or a path the code opens;
 - vndservice_contexts names the service that the code registers;
 - the init service runs the path where Android.bp installs the vendor binary that carries the .rc;
-- every .cpp of the service and the listener is in Android.bp, and (with --cmake-sources, written
+- every .cpp of the service, the listener and the client library is in Android.bp, and (with
+  --cmake-sources, written
   by the host build) the host build compiles the same sources for each library;
 - no Android.bp exists in, or points into, a host-only folder.
 
@@ -37,8 +38,9 @@ PLATFORM_TYPES = {
 DECLARING_MACROS = {"vendor_internal_prop", "vendor_restricted_prop", "vendor_public_prop"}
 # Folders that only the host build uses.
 HOST_ONLY = ["host", "sensors/simulator", "sensors/doubles", "tools/sandbox"]
-# Folders whose every .cpp belongs to a library or binary of both builds.
-SERVICE_FOLDERS = ["vyrservice", "apex_update_listener"]
+# Folders whose every .cpp belongs to a library or binary of both builds (the service, the
+# listener, the client library).
+SERVICE_FOLDERS = ["vyrservice", "apex_update_listener", "client"]
 # A vendor cc_binary is installed here.
 VENDOR_BIN = "/vendor/bin/"
 
