@@ -2,7 +2,7 @@
 set(ANDROID_LIB_DIR /usr/lib/${CMAKE_LIBRARY_ARCHITECTURE}/android)
 set(ANDROID_INCLUDE_DIR /usr/include/android)
 
-foreach(lib log base)
+foreach(lib log base cutils)
     find_library(ANDROID_${lib}_LIBRARY NAMES ${lib} PATHS ${ANDROID_LIB_DIR} NO_DEFAULT_PATH
                  REQUIRED)
     add_library(android::${lib} SHARED IMPORTED)

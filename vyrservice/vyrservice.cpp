@@ -1,4 +1,6 @@
 #define LOG_TAG "vyrservice"
+// Its slices and counters show up in a capture of the camera category.
+#define ATRACE_TAG ATRACE_TAG_CAMERA
 
 #include "vyrservice.h"
 
@@ -6,6 +8,7 @@
 #include <android-base/unique_fd.h>
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
+#include <cutils/trace.h>
 #include <fcntl.h>
 #include <log/log.h>
 #include <poll.h>
@@ -569,11 +572,14 @@ void VYRService::WorkLoop(unsigned int sensor_type) {
         // The queue's mutex is released: a worker never holds it with its sensor lock.
         std::lock_guard<std::mutex> lock(sensor_lock);
         ServiceModeParams& params = ParamsForMode(item->mode);
+        ATRACE_BEGIN(item->enable ? "vyr enable work" : "vyr disable work");
         if (item->enable) {
             EnableWork(*item, &params, sensor_type);
         } else {
             DisableWork(*item, &params, sensor_type);
         }
+        ATRACE_END();
+        TraceModeCounters(params);
         {
             std::lock_guard<std::mutex> shown(params.shown_mutex);
             params.shown_enable_count = params.enable_count;
@@ -651,6 +657,17 @@ void VYRService::DisableWork(const WorkItem& item, ServiceModeParams* params,
     }
 }
 
+void VYRService::TraceModeCounters(const ServiceModeParams& params) {
+    // One counter track per mode; names must be string literals that outlive the capture.
+    if (params.mode == kRangeMode) {
+        ATRACE_INT("vyr mode 3 enable count", params.enable_count);
+        ATRACE_INT("vyr mode 3 active period ms", params.active_period);
+    } else if (params.mode == kAlsMode) {
+        ATRACE_INT("vyr mode 1 enable count", params.enable_count);
+        ATRACE_INT("vyr mode 1 active period ms", params.active_period);
+    }
+}
+
 // Sampling.
 
 void VYRService::ProcessLoop(ServiceModeParams* params) {
@@ -662,10 +679,13 @@ void VYRService::ProcessLoop(ServiceModeParams* params) {
         const int32_t period = params->active_period;
         if (mode == kAlsMode || mode == kRangeMode) {
             if (mode == kAlsMode) {
+                ATRACE_BEGIN("vyr als read");
                 als_sensor_->ReadSingleShot(&reading, kAlsReadWait, kAlsIntegrationMs);
             } else {
+                ATRACE_BEGIN("vyr range read");
                 range_sensor_->Process(kRangeProcessMode, &data);
             }
+            ATRACE_END();
             // A reading taken across a disable is stale for whoever enables next.
             if (!params->running) {
                 return;
@@ -859,7 +879,9 @@ void VYRService::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
             // Its own reference: OnEvent may call SetCallback or Close, which drop the entry's.
             const std::shared_ptr<IEventCallback> callback = entry->callback;
             // A failed delivery is the death handler's business, not this loop's.
+            ATRACE_BEGIN("vyr deliver");
             callback->OnEvent(event);
+            ATRACE_END();
             ++entry->events_delivered;
             if (!enabled()) {
                 break;

@@ -107,6 +107,8 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     void WorkLoop(unsigned int sensor_type);
     void EnableWork(const WorkItem& item, ServiceModeParams* params, unsigned int sensor_type);
     void DisableWork(const WorkItem& item, ServiceModeParams* params, unsigned int sensor_type);
+    // The mode's enable count and active period as trace counters; by its worker.
+    void TraceModeCounters(const ServiceModeParams& params);
     void ProcessLoop(ServiceModeParams* params);
     void WaitFor(ServiceModeParams* params, int32_t ms);
     void MonitorDisplayStatus(const std::string& path);
