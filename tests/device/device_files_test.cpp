@@ -231,4 +231,23 @@ TEST_F(DeviceFilesTest, AModuleThatReachesIntoTheHostRuntimeFails) {
     EXPECT_FAILS_WITH(CheckCopy(), "libvyrservice reaches the host-only host/properties");
 }
 
+TEST_F(DeviceFilesTest, ACcTestMissingFromTestMappingFails) {
+    Edit("TEST_MAPPING", "    {\n      \"name\": \"vyrservice_event_parcel_tests\"\n    }\n", "");
+    Edit("TEST_MAPPING", "},\n  ]", "}\n  ]");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "TEST_MAPPING: cc_test vyrservice_event_parcel_tests is not mapped");
+}
+
+TEST_F(DeviceFilesTest, ATestMappingEntryForNoModuleFails) {
+    Edit("TEST_MAPPING", "\"vyrservice_apex_tests\"", "\"vyrservice_gone_tests\"");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "TEST_MAPPING: names vyrservice_gone_tests, which no Android.bp");
+}
+
+TEST_F(DeviceFilesTest, ACcTestWithoutTestSuitesFails) {
+    Edit("tests/service/Android.bp", "    test_suites: [\"device-tests\"],\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "cc_test vyrservice_event_conversion_tests names no test_suites");
+}
+
 }  // namespace

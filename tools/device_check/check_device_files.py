@@ -11,12 +11,15 @@
 - every .cpp of the service, the listener and the client library is in Android.bp, and (with
   --cmake-sources, written
   by the host build) the host build compiles the same sources for each library;
-- no Android.bp exists in, or points into, a host-only folder.
+- no Android.bp exists in, or points into, a host-only folder;
+- every cc_test names its test suites and is in the root TEST_MAPPING, which names no module that
+  does not exist.
 
 Prints one line per defect and exits 1 if there is any.
 """
 
 import argparse
+import json
 import os
 import re
 import sys
@@ -412,6 +415,41 @@ def check_host_only(checker, modules):
                                                f"host-only {target}")
 
 
+def check_test_mapping(checker, modules):
+    tests = sorted(m["props"].get("name") for m in modules if m["type"] == "cc_test")
+    for module in modules:
+        if module["type"] == "cc_test" and not module["props"].get("test_suites"):
+            checker.defect(module["file"], f"cc_test {module['props'].get('name')} names no "
+                           "test_suites")
+    if not checker.exists("TEST_MAPPING"):
+        checker.defect("TEST_MAPPING", "is missing: the device tests run from it")
+        return
+    try:
+        # TEST_MAPPING allows // comments on lines of their own.
+        text = "\n".join(line for line in checker.read("TEST_MAPPING").splitlines()
+                         if not line.lstrip().startswith("//"))
+        mapping = json.loads(text)
+    except ValueError as error:
+        checker.defect("TEST_MAPPING", f"is not valid JSON: {error}")
+        return
+    mapped = set()
+    for group, entries in mapping.items():
+        if not isinstance(entries, list):
+            continue
+        for entry in entries:
+            name = entry.get("name") if isinstance(entry, dict) else None
+            if not isinstance(name, str):
+                checker.defect("TEST_MAPPING", f"an entry of {group} has no name")
+                continue
+            mapped.add(name)
+    names = {m["props"].get("name") for m in modules}
+    for name in tests:
+        if name not in mapped:
+            checker.defect("TEST_MAPPING", f"cc_test {name} is not mapped")
+    for name in sorted(mapped - names):
+        checker.defect("TEST_MAPPING", f"names {name}, which no Android.bp defines")
+
+
 def main():
     parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
     parser.add_argument("root")
@@ -425,6 +463,7 @@ def main():
     check_service_name(checker)
     check_sources(checker, modules, args.cmake_sources)
     check_host_only(checker, modules)
+    check_test_mapping(checker, modules)
     for line in checker.defects:
         print(line)
     if checker.defects:
