@@ -34,6 +34,17 @@ VYR_DEBIAN_PACKAGES=(
     libc++-14-dev
     libc++abi-14-dev
     clang-format
+    # The arm64 step: Debian's aarch64 compiler, the same libraries for arm64 (multiarch), and
+    # qemu-user to run what it builds
+    g++-aarch64-linux-gnu
+    qemu-user-static
+    android-liblog-dev:arm64
+    android-libbase-dev:arm64
+    android-libcutils-dev:arm64
+    libtinyxml2-dev:arm64
+    libgtest-dev:arm64
+    libgmock-dev:arm64
+    libbenchmark-dev:arm64
 )
 
 # Prints the packages of VYR_DEBIAN_PACKAGES that are not installed, one per line.
@@ -71,6 +82,13 @@ vyr_install_deps() {
     fi
     local -a apt=("${as_root[@]}" env DEBIAN_FRONTEND=noninteractive apt-get -q -y
                   -o Dpkg::Options::=--force-confdef -o Dpkg::Options::=--force-confold)
+    # Packages of another architecture need it added to dpkg first.
+    if [[ " ${missing[*]}" == *":arm64"* ]] && ! dpkg --print-foreign-architectures | grep -qx arm64; then
+        "${as_root[@]}" dpkg --add-architecture arm64 || {
+            echo "deps: cannot add the arm64 architecture to dpkg" >&2
+            return 1
+        }
+    fi
     "${apt[@]}" update </dev/null &&
         "${apt[@]}" install --no-install-recommends "${missing[@]}" </dev/null || {
         echo "deps: apt-get failed" >&2

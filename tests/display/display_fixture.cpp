@@ -53,7 +53,7 @@ void DisplayTest::SetUp() {
     }
     sensor_doubles::Reset();
     Panel("Off");
-    baseline_threads_ = ThreadCount();
+    baseline_threads_ = vyr_test::SettledThreadCount();
     baseline_names_ = vyr_test::ThreadNames();
 }
 

@@ -178,7 +178,8 @@ TEST_F(ShutdownTest, OpenClientsHaveTheirNotificationThreadsJoined) {
 
     ASSERT_EQ(1u, callback->Events().size());
     EXPECT_EQ(4242, callback->Events().front().timestamp);
-    EXPECT_LT(ThreadCount(), threads_with_client);
+    EXPECT_TRUE(vyr_test::WaitForThreadCountBelow(threads_with_client, kWait))
+        << vyr_test::ThreadNames();
 }
 
 }  // namespace

@@ -117,7 +117,7 @@ TEST_F(OpenCloseTest, CloseOfEnabledClientEndsNotificationButKeepsEnableCount) {
     EXPECT_EQ(idle_threads + 1, ThreadCount());  // the notification thread
 
     EXPECT_TRUE(service_->Close(handle).isOk());
-    EXPECT_EQ(idle_threads, ThreadCount());
+    EXPECT_TRUE(WaitForThreadCount(idle_threads, kWait)) << vyr_test::ThreadNames();
     EXPECT_EQ(1, callback.use_count());
 
     const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2);

@@ -6,9 +6,7 @@ namespace vyr_service_test {
 
 void ServiceTest::SetUp() {
     sensor_doubles::Reset();
-    // Sanitizer runtimes start a helper thread on the first thread creation; count it in.
-    std::thread([] {}).join();
-    baseline_threads_ = ThreadCount();
+    baseline_threads_ = vyr_test::SettledThreadCount();
 }
 
 void ServiceTest::TearDown() {

@@ -1,6 +1,7 @@
 #include "thread_count.h"
 
 #include <dirent.h>
+#include <pthread.h>
 
 #include <cstdio>
 #include <fstream>
@@ -57,6 +58,21 @@ size_t ThreadCount() {
     return count;
 }
 
+size_t SettledThreadCount() {
+    constexpr char kProbe[] = "vyr-probe";
+    std::thread([&kProbe] { pthread_setname_np(pthread_self(), kProbe); }).join();
+    const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
+    bool lingering = true;
+    while (lingering && std::chrono::steady_clock::now() < deadline) {
+        lingering = false;
+        ForEachLiveThread([&lingering, &kProbe](const std::string& tid) {
+            if (ThreadName(tid) == kProbe) lingering = true;
+        });
+        if (lingering) std::this_thread::sleep_for(std::chrono::milliseconds(2));
+    }
+    return ThreadCount();
+}
+
 std::string ThreadNames() {
     std::string names;
     ForEachLiveThread([&names](const std::string& tid) {
@@ -65,13 +81,26 @@ std::string ThreadNames() {
     return names;
 }
 
-bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
+namespace {
+
+template <typename Done>
+bool WaitForThreads(Done done, std::chrono::milliseconds timeout) {
     const auto deadline = std::chrono::steady_clock::now() + timeout;
-    while (ThreadCount() != count) {
+    while (!done(ThreadCount())) {
         if (std::chrono::steady_clock::now() >= deadline) return false;
         std::this_thread::sleep_for(std::chrono::milliseconds(2));
     }
     return true;
+}
+
+}  // namespace
+
+bool WaitForThreadCount(size_t count, std::chrono::milliseconds timeout) {
+    return WaitForThreads([count](size_t now) { return now == count; }, timeout);
+}
+
+bool WaitForThreadCountBelow(size_t count, std::chrono::milliseconds timeout) {
+    return WaitForThreads([count](size_t now) { return now < count; }, timeout);
 }
 
 std::map<pid_t, unsigned long> VoluntarySwitches(const std::string& prefix) {
