@@ -10,9 +10,14 @@ VYR_DEBIAN_PACKAGES=(
     g++
     git
     aidl
-    # Checks of the device build files (scripts/check-device)
+    # Checks of the device build files (scripts/check-device), Soong's own loader among them
     blueprint-tools
     python3
+    golang-go
+    golang-android-soong-dev
+    golang-github-google-blueprint-dev
+    golang-goprotobuf-dev
+    golang-google-protobuf-dev
     # Platform libraries the service is written against
     android-liblog-dev
     android-libbase-dev

@@ -250,4 +250,27 @@ TEST_F(DeviceFilesTest, ACcTestWithoutTestSuitesFails) {
                       "cc_test vyrservice_event_conversion_tests names no test_suites");
 }
 
+TEST_F(DeviceFilesTest, AnUnknownPropertyFailsInSoong) {
+    Edit("client/Android.bp", "    vendor_available: true,", "    vendor_availble: true,");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "client/Android.bp:5:20: unrecognized property \"vendor_availble\"");
+}
+
+TEST_F(DeviceFilesTest, APropertyOfTheWrongTypeFailsInSoong) {
+    Edit("client/Android.bp", "    vendor_available: true,", "    vendor_available: \"yes\",");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "can't assign string value to bool property \"vendor_available\"");
+}
+
+TEST_F(DeviceFilesTest, AnUnknownModuleTypeFailsInSoong) {
+    Edit("client/Android.bp", "cc_library {", "cc_libary {");
+    EXPECT_FAILS_WITH(CheckCopy(), "unrecognized module type \"cc_libary\"");
+}
+
+TEST_F(DeviceFilesTest, AMissingDependencyFailsInSoong) {
+    Edit("client/Android.bp", "        \"libbinder_ndk\",\n",
+         "        \"libbinder_ndk\",\n        \"libnothere\",\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "depends on undefined module \"libnothere\"");
+}
+
 }  // namespace
