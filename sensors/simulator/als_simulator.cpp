@@ -16,8 +16,9 @@ constexpr uint8_t kStatusNotEnabled = 2;
 
 }  // namespace
 
-AlsSimulator::AlsSimulator(const Scenario& scenario, const std::atomic<bool>* enabled)
-    : scenario_(scenario), scene_(scenario.seed), enabled_(enabled) {
+AlsSimulator::AlsSimulator(const Scenario& scenario, const std::atomic<bool>* enabled,
+                           std::optional<Recording> replay)
+    : scenario_(scenario), scene_(scenario.seed), enabled_(enabled), replay_(std::move(replay)) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
         seen_enabled_ = enabled_->load();
@@ -50,6 +51,10 @@ int AlsSimulator::ReadSingleShot(ALSResult* result, bool wait, unsigned char int
             seen_enabled_ = true;
             PublishLocked();
             stop_.notify_all();
+            if (replay_) {
+                replay_->Restart();
+                replay_start_ = std::chrono::steady_clock::now();
+            }
         }
     }
     if (wait) {
@@ -65,6 +70,7 @@ int AlsSimulator::ReadSingleShot(ALSResult* result, bool wait, unsigned char int
         result->timestamp_ns = now_ns;
         return -EIO;
     }
+    if (replay_) return Replay(result);
     *result = scene_.LightSample(index, torch_lit, integration_ms);
     const bool invalid = scenario_.invalid_every > 0 && (index + 1) % scenario_.invalid_every == 0;
     result->status = invalid ? kStatusInvalid : kStatusOk;
@@ -72,6 +78,31 @@ int AlsSimulator::ReadSingleShot(ALSResult* result, bool wait, unsigned char int
     result->valid = invalid ? 0 : 1;
     result->timestamp_ns = now_ns;
     return 0;
+}
+
+int AlsSimulator::Replay(ALSResult* result) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    for (;;) {
+        const std::chrono::duration<double, std::milli> elapsed =
+            std::chrono::steady_clock::now() - replay_start_;
+        const Recording::Pick pick = replay_->Next(elapsed.count());
+        if (pick.sample != nullptr) {
+            *result = pick.sample->light;
+            if (result->valid == 0) result->status = kStatusInvalid;
+            return 0;
+        }
+        // The recording is ahead: wait for its next reading, or for the sensor to go off.
+        const auto due =
+            replay_start_ + std::chrono::duration_cast<std::chrono::nanoseconds>(
+                                std::chrono::duration<double, std::milli>(pick.ready_at_ms));
+        stop_.wait_until(lock, std::min(due, std::chrono::steady_clock::now() + kWatchInterval),
+                         [this] { return stopping_; });
+        if (stopping_ || !enabled_->load()) {
+            *result = ALSResult{};
+            result->status = kStatusNotEnabled;
+            return -EIO;
+        }
+    }
 }
 
 int AlsSimulator::Disable() {

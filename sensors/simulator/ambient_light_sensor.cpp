@@ -7,6 +7,8 @@
 #include <atomic>
 #include <cerrno>
 #include <mutex>
+#include <optional>
+#include <string>
 
 #include "als_simulator.h"
 #include "sensors_sim/scenario.h"
@@ -28,11 +30,29 @@ AmbientLightSensor* AmbientLightSensor::Create() {
                             "ambient light sensor Create failed (scenario)");
         return nullptr;
     }
-    __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
-                        "simulated ambient light sensor: seed %llu, extra latency %d ms",
-                        static_cast<unsigned long long>(scenario.seed), scenario.extra_latency_ms);
+    std::optional<sensors_sim::Recording> replay;
+    if (!scenario.als_replay.empty()) {
+        std::string error;
+        replay = sensors_sim::Recording::Load(scenario.als_replay,
+                                              sensors_sim::Recording::Sensor::kLight,
+                                              scenario.als_replay_loop, &error);
+        if (!replay) {
+            __android_log_print(ANDROID_LOG_ERROR, "sensors_sim",
+                                "ambient light sensor Create failed: als.replay %s", error.c_str());
+            return nullptr;
+        }
+        __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
+                            "simulated ambient light sensor: replaying %zu readings of %s%s",
+                            replay->size(), scenario.als_replay.c_str(),
+                            scenario.als_replay_loop ? " in a loop" : "");
+    } else {
+        __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
+                            "simulated ambient light sensor: seed %llu, extra latency %d ms",
+                            static_cast<unsigned long long>(scenario.seed),
+                            scenario.extra_latency_ms);
+    }
     g_instance = new AmbientLightSensor();
-    g_simulator = new sensors_sim::AlsSimulator(scenario, &g_instance->enabled);
+    g_simulator = new sensors_sim::AlsSimulator(scenario, &g_instance->enabled, std::move(replay));
     return g_instance;
 }
 

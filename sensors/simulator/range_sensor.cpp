@@ -7,6 +7,8 @@
 #include <atomic>
 #include <cerrno>
 #include <mutex>
+#include <optional>
+#include <string>
 
 #include "range_simulator.h"
 #include "sensors_sim/scenario.h"
@@ -29,11 +31,28 @@ RangeSensor* RangeSensor::Create() {
                             "range sensor Create failed (scenario)");
         return nullptr;
     }
-    __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
-                        "simulated range sensor: seed %llu, %d zones, extra latency %d ms",
-                        static_cast<unsigned long long>(scenario.seed), scenario.zone_count,
-                        scenario.extra_latency_ms);
-    g_simulator = new sensors_sim::RangeSimulator(scenario);
+    std::optional<sensors_sim::Recording> replay;
+    if (!scenario.range_replay.empty()) {
+        std::string error;
+        replay = sensors_sim::Recording::Load(scenario.range_replay,
+                                              sensors_sim::Recording::Sensor::kRange,
+                                              scenario.range_replay_loop, &error);
+        if (!replay) {
+            __android_log_print(ANDROID_LOG_ERROR, "sensors_sim",
+                                "range sensor Create failed: range.replay %s", error.c_str());
+            return nullptr;
+        }
+        __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
+                            "simulated range sensor: replaying %zu frames of %s%s", replay->size(),
+                            scenario.range_replay.c_str(),
+                            scenario.range_replay_loop ? " in a loop" : "");
+    } else {
+        __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
+                            "simulated range sensor: seed %llu, %d zones, extra latency %d ms",
+                            static_cast<unsigned long long>(scenario.seed), scenario.zone_count,
+                            scenario.extra_latency_ms);
+    }
+    g_simulator = new sensors_sim::RangeSimulator(scenario, std::move(replay));
     g_instance = new RangeSensor();
     return g_instance;
 }

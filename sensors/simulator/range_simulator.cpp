@@ -20,8 +20,8 @@ constexpr uint8_t kErrorInvalidFrame = 1;
 
 }  // namespace
 
-RangeSimulator::RangeSimulator(const Scenario& scenario)
-    : scenario_(scenario), scene_(scenario.seed) {
+RangeSimulator::RangeSimulator(const Scenario& scenario, std::optional<Recording> replay)
+    : scenario_(scenario), scene_(scenario.seed), replay_(std::move(replay)) {
     std::lock_guard<std::mutex> lock(mutex_);
     init_time_ = origin_ = Clock::now();
     PublishLocked();
@@ -55,7 +55,13 @@ int RangeSimulator::Uninit() {
 
 int RangeSimulator::Enable(bool enable) {
     std::lock_guard<std::mutex> lock(mutex_);
-    if (enable && !enabled_) RestartScheduleLocked(Clock::now(), frame_rate_hz_);
+    if (enable && !enabled_) {
+        RestartScheduleLocked(Clock::now(), frame_rate_hz_);
+        if (replay_) {
+            replay_->Restart();
+            replay_start_ = Clock::now();
+        }
+    }
     enabled_ = enable;
     changed_.notify_all();
     PublishLocked();
@@ -88,6 +94,7 @@ int RangeSimulator::Process(MultiRangingData* data) {
         FillIdleLocked(Clock::now(), data);
         return -EIO;
     }
+    if (replay_) return ReplayLocked(lock, data);
     const auto latency = std::chrono::milliseconds(scenario_.extra_latency_ms);
     for (;;) {
         const uint64_t version = schedule_version_;
@@ -105,6 +112,26 @@ int RangeSimulator::Process(MultiRangingData* data) {
         FillFrameLocked(frame, FrameReadyLocked(frame), data);
         next_frame_ = frame + 1;
         return 0;
+    }
+}
+
+int RangeSimulator::ReplayLocked(std::unique_lock<std::mutex>& lock, MultiRangingData* data) {
+    for (;;) {
+        const std::chrono::duration<double, std::milli> elapsed = Clock::now() - replay_start_;
+        const Recording::Pick pick = replay_->Next(elapsed.count());
+        if (pick.sample != nullptr) {
+            *data = pick.sample->range;
+            return 0;
+        }
+        // The recording is ahead of the sensor's time: wait for its next frame.
+        const auto due =
+            replay_start_ + std::chrono::duration_cast<Clock::duration>(
+                                std::chrono::duration<double, std::milli>(pick.ready_at_ms));
+        changed_.wait_until(lock, due, [&] { return !enabled_; });
+        if (!enabled_) {
+            FillIdleLocked(Clock::now(), data);
+            return -EIO;
+        }
     }
 }
 

@@ -4,7 +4,9 @@
 #include <condition_variable>
 #include <cstdint>
 #include <mutex>
+#include <optional>
 
+#include "sensors_sim/recording.h"
 #include "sensors_sim/scenario.h"
 #include "sensors_sim/scene_model.h"
 #include "ubk/range_sensor.h"
@@ -12,10 +14,12 @@
 namespace sensors_sim {
 
 // A multi-zone time-of-flight part ranging continuously: while enabled it completes a frame every
-// period (30 Hz unless configured), and Process hands out the next frame once it is ready.
+// period (30 Hz unless configured), and Process hands out the next frame once it is ready. With a
+// recording it hands out the recorded frames on their own time line instead.
 class RangeSimulator {
   public:
-    explicit RangeSimulator(const Scenario& scenario);
+    explicit RangeSimulator(const Scenario& scenario,
+                            std::optional<Recording> replay = std::nullopt);
     ~RangeSimulator();
     RangeSimulator(const RangeSimulator&) = delete;
     RangeSimulator& operator=(const RangeSimulator&) = delete;
@@ -40,6 +44,7 @@ class RangeSimulator {
     void FillFrameLocked(uint32_t frame, Clock::time_point ready, MultiRangingData* data) const;
     void FillIdleLocked(Clock::time_point now, MultiRangingData* data) const;
     void PublishLocked() const;
+    int ReplayLocked(std::unique_lock<std::mutex>& lock, MultiRangingData* data);
 
     const Scenario scenario_;
     const SceneModel scene_;
@@ -57,6 +62,9 @@ class RangeSimulator {
     double base_offset_ms_ = 0.0;
     uint32_t next_frame_ = 0;
     uint64_t schedule_version_ = 0;
+    std::optional<Recording> replay_;
+    // When the replay started: the last enable.
+    Clock::time_point replay_start_;
 };
 
 }  // namespace sensors_sim

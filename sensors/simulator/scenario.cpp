@@ -46,8 +46,29 @@ std::optional<bool> ParseFlag(const std::string& text) {
     return std::nullopt;
 }
 
+// `path` as seen from the folder of the scenario file `scenario_path`.
+std::string NextTo(const std::string& scenario_path, const std::string& path) {
+    if (path.empty() || path[0] == '/') return path;
+    const size_t slash = scenario_path.rfind('/');
+    return slash == std::string::npos ? path : scenario_path.substr(0, slash + 1) + path;
+}
+
 // Applies one setting; false when the key is unknown or the value unusable.
-bool Apply(const std::string& key, const std::string& value, Scenario* scenario) {
+bool Apply(const std::string& key, const std::string& value, const std::string& path,
+           Scenario* scenario) {
+    if (key == "range.replay" || key == "als.replay") {
+        if (value.empty()) return false;
+        (key == "range.replay" ? scenario->range_replay : scenario->als_replay) =
+            NextTo(path, value);
+        return true;
+    }
+    if (key == "range.replay.loop" || key == "als.replay.loop") {
+        const std::optional<bool> flag = ParseFlag(value);
+        if (!flag) return false;
+        (key == "range.replay.loop" ? scenario->range_replay_loop : scenario->als_replay_loop) =
+            *flag;
+        return true;
+    }
     if (key == "als.create_fails" || key == "range.create_fails" || key == "range.init_fails") {
         const std::optional<bool> flag = ParseFlag(value);
         if (!flag) return false;
@@ -103,7 +124,7 @@ Scenario ParseScenarioFile(const std::string& path) {
         const std::string key = Trim(trimmed.substr(0, equals));
         const std::string value =
             equals == std::string::npos ? "" : Trim(trimmed.substr(equals + 1));
-        if (equals == std::string::npos || !Apply(key, value, &scenario)) {
+        if (equals == std::string::npos || !Apply(key, value, path, &scenario)) {
             __android_log_print(ANDROID_LOG_WARN, kTag, "%s:%d: ignoring \"%s\"", path.c_str(),
                                 number, trimmed.c_str());
         }

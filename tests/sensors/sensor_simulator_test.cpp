@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "ambient_light_sensor.h"
+#include "log_capture.h"
 #include "temp_dir.h"
 #include "ubk/range_sensor.h"
 
@@ -443,6 +444,75 @@ TEST_F(SensorSimulatorTest, CallsFromManyThreadsAreSafe) {
     for (auto& thread : threads) thread.join();
     EXPECT_GT(frames.load(), 0);
     EXPECT_GT(samples.load(), 0);
+}
+
+// A range frame as vyrctl stream --json prints it, with one zone at `distance_mm`.
+std::string RecordedFrame(uint32_t time_ms, int distance_mm) {
+    return "{\"format\":1,\"sensor\":\"range\",\"handle\":1,\"status\":0,\"timestamp\":" +
+           std::to_string(time_ms) + ",\"value0\":0,\"value1\":0,\"data\":[" +
+           std::to_string(time_ms) + ",0,0,0,1,30,27,0,1," + std::to_string(time_ms / 10) + ",5," +
+           std::to_string(distance_mm) + ",3,900,40,1200,800,1,95,40,0]}\n";
+}
+
+TEST_F(SensorSimulatorTest, ARangeReplayHandsOutTheRecordedFramesInOrder) {
+    dir_.Write("walk.jsonl",
+               RecordedFrame(500, 1500) + RecordedFrame(530, 1400) + RecordedFrame(560, 1300));
+    // A relative path is read from the scenario file's folder.
+    UseScenario("range.replay = walk.jsonl\n");
+    ubk::RangeSensor* range = StartRange();
+    ASSERT_NE(range, nullptr);
+    std::vector<int> distances;
+    std::vector<uint32_t> times;
+    for (int i = 0; i < 4; ++i) {
+        MultiRangingData data{};
+        ASSERT_EQ(range->Process(3, &data), 0);
+        EXPECT_EQ(data.valid, 1);
+        distances.push_back(data.zones[0].distance_mm);
+        times.push_back(data.time_ms);
+    }
+    // Without a loop the last frame stays.
+    EXPECT_EQ(distances, (std::vector<int>{1500, 1400, 1300, 1300}));
+    EXPECT_EQ(times, (std::vector<uint32_t>{500, 530, 560, 560}));
+}
+
+TEST_F(SensorSimulatorTest, AReplayFileThatIsNoRecordingFailsCreateWithItsLine) {
+    vyr_test::LogCapture log;
+    const std::string path = dir_.Write("bad.jsonl", RecordedFrame(0, 1000) + "frame two\n");
+    UseScenario("range.replay=" + path + "\nals.replay=" + dir_.Path("none.jsonl") + "\n");
+    EXPECT_EQ(ubk::RangeSensor::Create(), nullptr);
+    EXPECT_TRUE(
+        log.Contains("sensors_sim", ANDROID_LOG_ERROR,
+                     "range sensor Create failed: range.replay " + path + ":2: not a JSON object"));
+    EXPECT_EQ(AmbientLightSensor::Create(), nullptr);
+    EXPECT_TRUE(log.Contains("sensors_sim", ANDROID_LOG_ERROR,
+                             "ambient light sensor Create failed: als.replay " +
+                                 dir_.Path("none.jsonl") + ": cannot be read"));
+}
+
+TEST_F(SensorSimulatorTest, ALightReplayLoopsAndStopsWhenTheSensorGoesOff) {
+    std::string lines;
+    for (int i = 0; i < 3; ++i) {
+        lines += "{\"sensor\":\"als\",\"status\":0,\"timestamp\":" +
+                 std::to_string(1000000 + i * 20000000) +
+                 ",\"value0\":4000,\"value1\":" + std::to_string(100 + i) +
+                 ",\"data\":[1,2,3,5,4]}\n";
+    }
+    dir_.Write("light.jsonl", lines);
+    UseScenario("als.replay=light.jsonl\nals.replay.loop=1\n");
+    AmbientLightSensor* als = StartAls();
+    ASSERT_NE(als, nullptr);
+    std::vector<float> lux;
+    for (int i = 0; i < 7; ++i) {
+        ALSResult result{};
+        ASSERT_EQ(als->ReadSingleShot(&result, false, 0), 0);
+        lux.push_back(result.lux);
+        EXPECT_EQ(result.channels[3], 4);
+        EXPECT_EQ(result.channels[4], 5);
+    }
+    EXPECT_EQ(lux, (std::vector<float>{100, 101, 102, 100, 101, 102, 100}));
+    als->enabled = false;
+    ALSResult result{};
+    EXPECT_EQ(als->ReadSingleShot(&result, false, 0), -EIO);
 }
 
 }  // namespace

@@ -114,7 +114,8 @@ std::string FormatEventReadable(int32_t mode, const Event& event) {
 
 std::string FormatEventJson(int32_t mode, int32_t handle, const Event& event) {
     std::string json =
-        std::string("{\"sensor\":\"") + ModeName(mode) + "\",\"handle\":" + std::to_string(handle) +
+        std::string("{\"format\":") + std::to_string(kRecordingFormat) + ",\"sensor\":\"" +
+        ModeName(mode) + "\",\"handle\":" + std::to_string(handle) +
         ",\"status\":" + StatusText(event) + ",\"timestamp\":" + std::to_string(event.timestamp) +
         ",\"value0\":" + JsonNumber(event.value0) + ",\"value1\":" + JsonNumber(event.value1) +
         ",\"data\":" + JsonList(event.data);

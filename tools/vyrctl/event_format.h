@@ -38,6 +38,10 @@ constexpr size_t kRangeFrameNumberIndex = 9;
 constexpr size_t kZoneStatusOffset = 0;
 constexpr size_t kZoneDistanceOffset = 1;
 
+// The version of the JSON lines that `stream --json` prints, a recording's format: raised when a
+// field changes meaning or goes, never when one is added.
+constexpr int kRecordingFormat = 1;
+
 AlsReading DecodeAls(const aidl::android::vyr::Event& event);
 RangeFrame DecodeRange(const aidl::android::vyr::Event& event);
 

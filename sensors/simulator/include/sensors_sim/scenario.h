@@ -17,6 +17,13 @@ struct Scenario {
     // Zones reported per range frame, 0..kMaxRangingZones (4 is the full 2x2 grid).
     int zone_count = 4;
     uint64_t seed = 1;
+    // A recording (vyrctl stream --json) that the sensor plays back instead of the synthetic
+    // scene, from the start again at its end when `*_replay_loop`; a relative path is taken
+    // from the scenario file's folder.
+    std::string range_replay;
+    bool range_replay_loop = false;
+    std::string als_replay;
+    bool als_replay_loop = false;
 };
 
 inline constexpr char kScenarioVariable[] = "VYR_SENSOR_SCENARIO";
