@@ -28,8 +28,10 @@ VYR_DEBIAN_PACKAGES=(
     libgtest-dev
     libgmock-dev
     libbenchmark-dev
-    # JSON parsing in tests of the service's dump
+    # JSON parsing in tests of the service's dump and in the simulators' replay
     nlohmann-json3-dev
+    # tools/plot-recording
+    python3-matplotlib
     # unshare and nsenter, for the tests that run processes in their own namespaces
     util-linux
     # The fuzz preset (libFuzzer comes with clang's runtime libraries) and the format check
@@ -52,13 +54,20 @@ VYR_DEBIAN_PACKAGES=(
     libbenchmark-dev:arm64
 )
 
-# Prints the packages of VYR_DEBIAN_PACKAGES that are not installed, one per line.
+# Prints the packages of VYR_DEBIAN_PACKAGES that are not installed, one per line. A name without
+# an architecture means the machine's own (or "all"): with arm64 added, a Multi-Arch package may be
+# installed for both, and only the native one counts for it.
 vyr_missing_packages() {
-    local package
+    local package native status
+    native=$(dpkg --print-architecture)
     for package in "${VYR_DEBIAN_PACKAGES[@]}"; do
-        if [[ "$(dpkg-query -W -f='${Status}' "$package" 2>/dev/null)" != "install ok installed" ]]; then
-            echo "$package"
+        if [[ "$package" == *:* ]]; then
+            status=$(dpkg-query -W -f='${Status}' "$package" 2>/dev/null)
+        else
+            status=$(dpkg-query -W -f='${Status}' "$package:$native" 2>/dev/null ||
+                dpkg-query -W -f='${Status}' "$package:all" 2>/dev/null)
         fi
+        [[ "$status" == "install ok installed" ]] || echo "$package"
     done
 }
 
