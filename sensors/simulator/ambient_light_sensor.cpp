@@ -31,21 +31,12 @@ AmbientLightSensor* AmbientLightSensor::Create() {
         return nullptr;
     }
     std::optional<sensors_sim::Recording> replay;
-    if (!scenario.als_replay.empty()) {
-        std::string error;
-        replay = sensors_sim::Recording::Load(scenario.als_replay,
-                                              sensors_sim::Recording::Sensor::kLight,
-                                              scenario.als_replay_loop, &error);
-        if (!replay) {
-            __android_log_print(ANDROID_LOG_ERROR, "sensors_sim",
-                                "ambient light sensor Create failed: als.replay %s", error.c_str());
-            return nullptr;
-        }
-        __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
-                            "simulated ambient light sensor: replaying %zu readings of %s%s",
-                            replay->size(), scenario.als_replay.c_str(),
-                            scenario.als_replay_loop ? " in a loop" : "");
-    } else {
+    if (!sensors_sim::Recording::LoadReplay(
+            scenario.als_replay, sensors_sim::Recording::Sensor::kLight, scenario.als_replay_loop,
+            "als.replay", "ambient light sensor", &replay)) {
+        return nullptr;
+    }
+    if (!replay) {
         __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
                             "simulated ambient light sensor: seed %llu, extra latency %d ms",
                             static_cast<unsigned long long>(scenario.seed),

@@ -32,21 +32,12 @@ RangeSensor* RangeSensor::Create() {
         return nullptr;
     }
     std::optional<sensors_sim::Recording> replay;
-    if (!scenario.range_replay.empty()) {
-        std::string error;
-        replay = sensors_sim::Recording::Load(scenario.range_replay,
-                                              sensors_sim::Recording::Sensor::kRange,
-                                              scenario.range_replay_loop, &error);
-        if (!replay) {
-            __android_log_print(ANDROID_LOG_ERROR, "sensors_sim",
-                                "range sensor Create failed: range.replay %s", error.c_str());
-            return nullptr;
-        }
-        __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
-                            "simulated range sensor: replaying %zu frames of %s%s", replay->size(),
-                            scenario.range_replay.c_str(),
-                            scenario.range_replay_loop ? " in a loop" : "");
-    } else {
+    if (!sensors_sim::Recording::LoadReplay(
+            scenario.range_replay, sensors_sim::Recording::Sensor::kRange,
+            scenario.range_replay_loop, "range.replay", "range sensor", &replay)) {
+        return nullptr;
+    }
+    if (!replay) {
         __android_log_print(ANDROID_LOG_INFO, "sensors_sim",
                             "simulated range sensor: seed %llu, %d zones, extra latency %d ms",
                             static_cast<unsigned long long>(scenario.seed), scenario.zone_count,

@@ -1,5 +1,7 @@
 #include "sensors_sim/recording.h"
 
+#include <android/log.h>
+
 #include <algorithm>
 #include <cmath>
 #include <fstream>
@@ -11,6 +13,8 @@ namespace sensors_sim {
 namespace {
 
 using nlohmann::json;
+
+constexpr char kTag[] = "sensors_sim";
 
 // Values of the event's header before the zones, and per zone, as the conversion writes them.
 constexpr size_t kRangeHeaderValues = 10;
@@ -190,6 +194,21 @@ std::optional<Recording> Recording::Load(const std::string& path, Sensor sensor,
         return std::nullopt;
     }
     return Recording(std::move(samples), loop);
+}
+
+bool Recording::LoadReplay(const std::string& path, Sensor sensor, bool loop, const char* key,
+                           const char* part, std::optional<Recording>* replay) {
+    if (path.empty()) return true;
+    std::string error;
+    *replay = Load(path, sensor, loop, &error);
+    if (!*replay) {
+        __android_log_print(ANDROID_LOG_ERROR, kTag, "%s Create failed: %s %s", part, key,
+                            error.c_str());
+        return false;
+    }
+    __android_log_print(ANDROID_LOG_INFO, kTag, "simulated %s: replaying %zu records of %s%s", part,
+                        (*replay)->size(), path.c_str(), loop ? " in a loop" : "");
+    return true;
 }
 
 Recording::Recording(std::vector<Sample> samples, bool loop)

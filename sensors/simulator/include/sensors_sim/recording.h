@@ -36,6 +36,11 @@ class Recording {
     // cannot be read or a line is not a record of that sensor.
     static std::optional<Recording> Load(const std::string& path, Sensor sensor, bool loop,
                                          std::string* error);
+    // What a simulator's Create() does with its scenario's replay keys (`key`, as "range.replay"):
+    // loads `path` into `replay` (nothing when `path` is empty) and logs it; false, with the
+    // reason logged as `part`'s failed Create, when it cannot.
+    static bool LoadReplay(const std::string& path, Sensor sensor, bool loop, const char* key,
+                           const char* part, std::optional<Recording>* replay);
 
     // Starts over at the first record: the sensor was enabled.
     void Restart() { taken_ = -1; }
