@@ -177,7 +177,11 @@ TEST_F(CrossProcessTest, CallsReachTheOtherProcess) {
 }
 
 // The caller reads its own reply: none of the runtime's threads wakes for a call. (Threads of
-// sanitizer runtimes wake on their own.)
+// sanitizer runtimes wake on their own.) A pool thread woken by replies wakes about once a call;
+// two stray wake-ups over all the calls are allowed, so that the rare one seen on a loaded
+// machine under ASan does not fail the test.
+constexpr unsigned long kStrayWakeUps = 2;
+
 void ExpectCallsWakeOnlyTheCaller(IVYRService& service) {
     int32_t result = 0;
     ASSERT_TRUE(service.Enable(1, 2, &result).isOk());
@@ -189,7 +193,8 @@ void ExpectCallsWakeOnlyTheCaller(IVYRService& service) {
     }
     for (const auto& [tid, switches] : vyr_test::VoluntarySwitches("binder:")) {
         if (before.count(tid) == 0) continue;
-        EXPECT_EQ(before[tid], switches) << "thread " << tid << " woke during the calls";
+        EXPECT_LE(switches - before[tid], kStrayWakeUps)
+            << "thread " << tid << " woke during the calls";
     }
 }
 
