@@ -110,6 +110,14 @@ void Release(const std::string& name) {
     s.changed.notify_all();
 }
 
+void ReleaseBlocked(const std::string& name) {
+    DoubleState& s = DoubleState::Get();
+    std::lock_guard<std::mutex> lock(s.mutex);
+    s.ReleaseLocked(s.holds[name]);
+    s.holds[name].held = true;
+    s.changed.notify_all();
+}
+
 bool WaitUntilHeld(const std::string& name, std::chrono::milliseconds timeout) {
     DoubleState& s = DoubleState::Get();
     std::unique_lock<std::mutex> lock(s.mutex);

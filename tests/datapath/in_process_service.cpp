@@ -85,8 +85,7 @@ void InProcessServiceTest::PublishNextSample() {
     ASSERT_NE(held_call_, nullptr);
     size_t reads = sensor_doubles::CountOf(held_call_);
     // The blocked read returns and its sample is stored; the read after it is held again.
-    sensor_doubles::Release(held_call_);
-    sensor_doubles::Hold(held_call_);
+    sensor_doubles::ReleaseBlocked(held_call_);
     ASSERT_TRUE(sensor_doubles::WaitForCalls(held_call_, reads + 1, kWait));
 }
 

@@ -286,6 +286,23 @@ TEST_F(SensorDoublesTest, HeldCallReturnsDataQueuedWhileHeld) {
     EXPECT_EQ(result.get(), 42u);
 }
 
+TEST_F(SensorDoublesTest, ReleaseBlockedHoldsTheVeryNextCall) {
+    AmbientLightSensor* als = AmbientLightSensor::Create();
+    sd::Hold(sd::kAlsDisable);
+    // Two calls in a row: nothing between them gives the test a chance to hold again.
+    std::thread caller([&] {
+        als->Disable();
+        als->Disable();
+    });
+    ASSERT_TRUE(sd::WaitUntilHeld(sd::kAlsDisable, 5s));
+    sd::ReleaseBlocked(sd::kAlsDisable);
+    ASSERT_TRUE(sd::WaitForCalls(sd::kAlsDisable, 2, 5s));
+    EXPECT_TRUE(sd::WaitUntilHeld(sd::kAlsDisable, 5s)) << "the second call went through";
+    sd::Release(sd::kAlsDisable);
+    caller.join();
+    EXPECT_EQ(sd::CountOf(sd::kAlsDisable), 2u);
+}
+
 TEST_F(SensorDoublesTest, WaitUntilHeldTimesOutWhenNothingBlocks) {
     sd::Hold(sd::kAlsReadSingleShot);
     EXPECT_FALSE(sd::WaitUntilHeld(sd::kAlsReadSingleShot, 20ms));

@@ -214,7 +214,8 @@ TEST(EventFormatTest, AlsJsonNamesTheValues) {
     event.value1 = 120.5f;
     event.data = {1, 2, 3, 5, 4};
     EXPECT_EQ(FormatEventJson(kModeAls, 9, event),
-              "{\"format\":1,\"sensor\":\"als\",\"handle\":9,\"status\":1,\"timestamp\":7,\"value0\":4500,"
+              "{\"format\":1,\"sensor\":\"als\",\"handle\":9,\"status\":1,\"timestamp\":7,"
+              "\"value0\":4500,"
               "\"value1\":120.5,\"data\":[1,2,3,5,4],\"lux\":120.5,\"color_temperature\":4500,"
               "\"channels\":[1,2,3,5,4]}");
 }

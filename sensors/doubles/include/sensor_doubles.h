@@ -70,6 +70,9 @@ void SetDelay(const std::string& name, std::chrono::milliseconds delay);
 // Calls named `name` block (after being recorded) until Release(name).
 void Hold(const std::string& name);
 void Release(const std::string& name);
+// Lets the calls named `name` that are blocked now go on and keeps holding the name, in one step:
+// the next call blocks however soon it comes (Release and then Hold would let a fast one through).
+void ReleaseBlocked(const std::string& name);
 // Waits until a call named `name` is blocked by Hold; false on time-out.
 bool WaitUntilHeld(const std::string& name, std::chrono::milliseconds timeout);
 
