@@ -86,16 +86,16 @@ TEST(FrameBufferTest, AHeaderAloneDoesNotSizeTheBuffer) {
     EXPECT_EQ(BufferedBytes(), before) << "a buffer gives its room back when it goes";
 }
 
-// A caller waiting for its reply is not woken when the peer reads the call it sent, only when
-// the reply comes.
-TEST(FrameBufferTest, AWaitingReadSleepsThroughThePeerTakingWhatItSent) {
+// How often a caller waiting for its reply goes to sleep while the peer first takes the call
+// it sent and then sends the reply.
+unsigned long SleepsOfAWaitingRead() {
     SocketPair pair;
     std::atomic<pid_t> waiter_tid{0};
     unsigned long sleeps = 0;
     FrameBuffer::Result result = FrameBuffer::Result::kMalformed;
     std::thread waiter([&] {
         const std::vector<uint8_t> call(4096, 3);
-        ASSERT_EQ(static_cast<ssize_t>(call.size()),
+        EXPECT_EQ(static_cast<ssize_t>(call.size()),
                   send(pair.reader(), call.data(), call.size(), 0));
         const pid_t tid = static_cast<pid_t>(syscall(SYS_gettid));
         const unsigned long before = vyr_test::VoluntarySwitches()[tid];
@@ -105,17 +105,29 @@ TEST(FrameBufferTest, AWaitingReadSleepsThroughThePeerTakingWhatItSent) {
         sleeps = vyr_test::VoluntarySwitches()[tid] - before;
     });
     while (waiter_tid.load() == 0) std::this_thread::yield();
-    ASSERT_TRUE(vyr_test::WaitUntilAsleep(waiter_tid, std::chrono::seconds(10)));
+    EXPECT_TRUE(vyr_test::WaitUntilAsleep(waiter_tid, std::chrono::seconds(10)));
     // The peer takes the call: the socket has room again, which wakes a plain blocking read.
     std::vector<uint8_t> call(4096);
-    ASSERT_EQ(static_cast<ssize_t>(call.size()),
+    EXPECT_EQ(static_cast<ssize_t>(call.size()),
               recv(pair.writer(), call.data(), call.size(), MSG_WAITALL));
-    ASSERT_TRUE(vyr_test::WaitUntilAsleep(waiter_tid, std::chrono::seconds(10)));
+    EXPECT_TRUE(vyr_test::WaitUntilAsleep(waiter_tid, std::chrono::seconds(10)));
     const FrameHeader reply = SmallFrameHeader();
     pair.Write(&reply, sizeof(reply));
     waiter.join();
     EXPECT_EQ(FrameBuffer::Result::kFrame, result);
-    EXPECT_EQ(1u, sleeps) << "the waiting thread went to sleep more than once for one reply";
+    return sleeps;
+}
+
+// A caller waiting for its reply is not woken when the peer reads the call it sent, only when
+// the reply comes. A read woken by the peer's taking sleeps twice every time; a sanitizer's
+// runtime can add a stray sleep now and then, so one of three tries must show a single sleep.
+TEST(FrameBufferTest, AWaitingReadSleepsThroughThePeerTakingWhatItSent) {
+    std::vector<unsigned long> sleeps;
+    while (sleeps.size() < 3 && (sleeps.empty() || sleeps.back() != 1)) {
+        sleeps.push_back(SleepsOfAWaitingRead());
+    }
+    EXPECT_EQ(1u, sleeps.back()) << "the waiting thread went to sleep more than once for one "
+                                    "reply in every try";
 }
 
 TEST(FrameBufferTest, AReadThatLeavesBytesInTheSocketIsNotDrained) {

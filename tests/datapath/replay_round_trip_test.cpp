@@ -115,7 +115,8 @@ TEST_F(ReplayRoundTripTest, ReplayedEventsAreTheRecordedOnesInOrderAlsoAcrossALo
         for (const json& event : Events(light_lines)) looped.push_back(event);
     }
     EXPECT_TRUE(IsSubsequence(light_again, looped)) << "replayed:\n" << json(light_again).dump(1);
-    EXPECT_NE(replaying.Log().find("range sensor: replaying 30 records of"), std::string::npos) << replaying.Log();
+    EXPECT_NE(replaying.Log().find("range sensor: replaying 30 records of"), std::string::npos)
+        << replaying.Log();
 }
 
 TEST_F(ReplayRoundTripTest, ABadRecordingLeavesTheSensorAbsentAndTheServiceServing) {
