@@ -658,7 +658,7 @@ void VYRService::DisableWork(const WorkItem& item, ServiceModeParams* params,
 }
 
 void VYRService::TraceModeCounters(const ServiceModeParams& params) {
-    // One counter track per mode; names must be string literals that outlive the capture.
+    // One counter track per mode, named as the README lists them.
     if (params.mode == kRangeMode) {
         ATRACE_INT("vyr mode 3 enable count", params.enable_count);
         ATRACE_INT("vyr mode 3 active period ms", params.active_period);
