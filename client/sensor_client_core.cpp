@@ -1,5 +1,6 @@
 #include "sensor_client_core.h"
 
+#include <android/binder_process.h>
 #include <pthread.h>
 
 #include <algorithm>
@@ -32,6 +33,7 @@ int32_t SensorClient::Core::Start(std::shared_ptr<IVYRService> service) {
         last_event_ = steady_clock::now();
     }
     if (service == nullptr) return kNotAttached;
+    if (!ABinderProcess_isThreadPoolStarted()) return kNoThreadPool;
     if (sink_ == nullptr) {
         sink_ = ndk::SharedRefBase::make<EventSink>([weak = weak_from_this()](const Event& event) {
             if (std::shared_ptr<Core> core = weak.lock()) core->Deliver(event);
@@ -107,14 +109,12 @@ SensorClient::Core::Attempt SensorClient::Core::Attach(const std::shared_ptr<IVY
         linked_ = binder;
         link_cookie_ = cookie;
     }
-    // Linked first: a death at any later step is noticed.
+    // Linked first: a death at any later step is noticed. A link that fails has already been
+    // reported unlinked, which freed the cookie.
     if (AIBinder_linkToDeath(binder.get(), recipient_, cookie) != STATUS_OK) {
-        {
-            std::lock_guard<std::mutex> lock(mutex_);
-            linked_ = ndk::SpAIBinder();
-            link_cookie_ = nullptr;
-        }
-        delete cookie;
+        std::lock_guard<std::mutex> lock(mutex_);
+        linked_ = ndk::SpAIBinder();
+        link_cookie_ = nullptr;
         return {Attempt::kDied};
     }
     int32_t result = 0;
@@ -314,7 +314,7 @@ void SensorClient::Core::OnRegistered(const char* /*instance*/, AIBinder* regist
     auto* core = static_cast<Core*>(cookie);
     {
         std::lock_guard<std::mutex> lock(core->mutex_);
-        AIBinder_incStrong(registered);
+        // Each notice hands over a reference of its own.
         core->registered_.set(registered);
     }
     core->changed_.notify_all();

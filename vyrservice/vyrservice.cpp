@@ -139,15 +139,12 @@ VYRService::~VYRService() {
         entry->callback.reset();
     }
 
-    // Deleting a recipient unlinks what is still linked; nothing may report that to this object
-    // any more.
+    // Deleting a recipient unlinks what is still linked. The runtime reports each such unlink
+    // while its link is being freed here, its cookie still valid, and finds the table empty.
     std::unordered_map<const DeathCookie*, std::unique_ptr<DeathLink>> links;
     {
         std::lock_guard<std::mutex> lock(links_mutex_);
         links.swap(death_links_);
-    }
-    for (auto& [cookie, link] : links) {
-        AIBinder_DeathRecipient_setOnUnlinked(link->recipient.get(), nullptr);
     }
 }
 
@@ -389,9 +386,8 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
     if (AIBinder_linkToDeath(entry.callback_binder.get(), entry.death_recipient,
                              const_cast<DeathCookie*>(entry.death_cookie)) != STATUS_OK) {
         // No notice can come for a link that was never made (a binder of this process, or one
-        // already dead: its client then goes with its process).
-        std::lock_guard<std::mutex> lock(links_mutex_);
-        link->unlinked = true;
+        // already dead: its client then goes with its process); the runtime has reported it
+        // unlinked already.
         entry.death_cookie = nullptr;
         entry.death_recipient = nullptr;
     }
@@ -461,7 +457,8 @@ void VYRService::ReleaseDeadClient(int32_t handle, const std::string& cause,
     ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry->mode);
     RecordEvent("death of handle " + std::to_string(handle) + " (" + cause + ")");
     if (entry->death_recipient != nullptr) {
-        // The cookie is deliberately null: every link of the recipient on the binder goes.
+        // The cookie is deliberately null, and no link is made with a null one, so this removes
+        // nothing: the link whose notice runs now ends with it, and the runtime reports that.
         AIBinder_unlinkToDeath(entry->callback_binder.get(), entry->death_recipient, nullptr);
     }
     DisableInternal(handle, /*client_died=*/true);

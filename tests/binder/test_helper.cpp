@@ -7,11 +7,15 @@
 //   binder_test_helper watch <name>            links to the death of <name>, then creates
 //                                              <name>.linked.<pid> in VYR_BINDER_DIR; exits 0
 //                                              when the death notice comes
+//   binder_test_helper latepool <name>         as watch, without a thread pool: once <name> is
+//                                              dead, exits 5 if a notice came all the same,
+//                                              else starts the pool and exits 0 when it comes
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -67,19 +71,47 @@ void ExitOnDeath(void* /*cookie*/) {
     _exit(0);
 }
 
-int Watch(const std::string& name) {
-    ABinderProcess_startThreadPool();
-    ndk::SpAIBinder binder(AServiceManager_getService(name.c_str()));
-    if (binder.get() == nullptr) return 2;
-    AIBinder_DeathRecipient* recipient = AIBinder_DeathRecipient_new(&ExitOnDeath);
-    if (AIBinder_linkToDeath(binder.get(), recipient, nullptr) != STATUS_OK) return 3;
+// Links `on_died` to the death of the service `name`, then tells the test so; 0 or the exit
+// status of the step that failed.
+int LinkAndTell(const std::string& name, AIBinder_DeathRecipient_onBinderDied on_died,
+                ndk::SpAIBinder* binder) {
+    *binder = ndk::SpAIBinder(AServiceManager_getService(name.c_str()));
+    if (binder->get() == nullptr) return 2;
+    AIBinder_DeathRecipient* recipient = AIBinder_DeathRecipient_new(on_died);
+    if (AIBinder_linkToDeath(binder->get(), recipient, nullptr) != STATUS_OK) return 3;
     const char* dir = getenv("VYR_BINDER_DIR");
     const std::string marker = std::string(dir != nullptr ? dir : "/tmp") + "/" + name +
                                ".linked." + std::to_string(getpid());
     int fd = open(marker.c_str(), O_CREAT | O_WRONLY | O_CLOEXEC, 0600);
     if (fd < 0) return 4;
     close(fd);
+    return 0;
+}
+
+int Watch(const std::string& name) {
+    ABinderProcess_startThreadPool();
+    ndk::SpAIBinder binder;
+    if (int failed = LinkAndTell(name, &ExitOnDeath, &binder)) return failed;
     for (;;) pause();
+}
+
+std::atomic<int> g_deaths{0};
+
+void CountDeath(void* /*cookie*/) {
+    ++g_deaths;
+}
+
+int LatePool(const std::string& name) {
+    ndk::SpAIBinder binder;
+    if (int failed = LinkAndTell(name, &CountDeath, &binder)) return failed;
+    // The proxy is dead as soon as the runtime reads the hang-up, pool or not.
+    while (AIBinder_isAlive(binder.get())) usleep(1000);
+    // A notice would need a pool thread, and there is none.
+    usleep(300 * 1000);
+    if (g_deaths != 0) return 5;
+    ABinderProcess_startThreadPool();
+    for (int waited_ms = 0; waited_ms < 10000 && g_deaths == 0; ++waited_ms) usleep(1000);
+    return g_deaths == 1 ? 0 : 6;
 }
 
 }  // namespace
@@ -89,6 +121,7 @@ int main(int argc, char** argv) {
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
     if (argc == 3 && strcmp(argv[1], "nopool") == 0) return NoPool(argv[2]);
     if (argc == 3 && strcmp(argv[1], "watch") == 0) return Watch(argv[2]);
-    fprintf(stderr, "usage: %s serve|client|nopool|watch <name>\n", argv[0]);
+    if (argc == 3 && strcmp(argv[1], "latepool") == 0) return LatePool(argv[2]);
+    fprintf(stderr, "usage: %s serve|client|nopool|watch|latepool <name>\n", argv[0]);
     return 64;
 }

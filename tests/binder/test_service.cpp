@@ -27,6 +27,10 @@ ndk::ScopedAStatus TestService::Open(int32_t mode, int32_t* result) {
         *result = 0;
         return ndk::ScopedAStatus::ok();
     }
+    if (mode == kQueryTorchCaller) {
+        *result = torch_caller_.load();
+        return ndk::ScopedAStatus::ok();
+    }
     *result = mode == kQueryTorch ? torch_state_.load() : mode * 10;
     return ndk::ScopedAStatus::ok();
 }
@@ -98,6 +102,7 @@ ndk::ScopedAStatus TestService::ConfigureParameters(int32_t /*handle*/,
 }
 
 ndk::ScopedAStatus TestService::SetTorchLightState(int32_t state) {
+    torch_caller_ = static_cast<int32_t>(AIBinder_getCallingPid());
     torch_state_ = state;
     return ndk::ScopedAStatus::ok();
 }

@@ -26,6 +26,8 @@ using aidl::android::vyr::IVYRService;
 class TestService : public BnVYRService {
   public:
     static constexpr int32_t kQueryTorch = -100;
+    // Open(kQueryTorchCaller): the calling pid SetTorchLightState last saw.
+    static constexpr int32_t kQueryTorchCaller = -102;
     static constexpr int32_t kTorchCalleeLater = -101;
     static constexpr const char* kCalleeName = "vyr.callee";
     static constexpr int32_t kCalleeTorch = 7;
@@ -53,6 +55,7 @@ class TestService : public BnVYRService {
     std::shared_ptr<IEventCallback> callback_;
     std::vector<std::thread> senders_;
     std::atomic<int32_t> torch_state_{-1};
+    std::atomic<int32_t> torch_caller_{-1};
 };
 
 // Records the events it receives.

@@ -8,6 +8,7 @@
 #include <signal.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
+#include <vyr/binder_host.h>
 #include <vyr/sensor_client.h>
 
 #include <chrono>
@@ -24,6 +25,7 @@
 #include "child_process.h"
 #include "service_process.h"
 #include "temp_dir.h"
+#include "test_service.h"
 #include "thread_count.h"
 
 namespace {
@@ -336,6 +338,56 @@ TEST_F(SensorClientTest, AFailedStartLeavesNothingOpenAndMayBeTriedAgain) {
     EXPECT_EQ(client.Start(Service()), -EALREADY);
     ExpectCalls(fake.get(), {"Open 3 -> -1"});
     ExpectCalls(fake.get(), AttachCalls(1));
+}
+
+// A binder of this process cannot be linked to: the runtime reports the link gone inside the
+// failed call, and the cookie is freed there once (AddressSanitizer tells a second free).
+TEST_F(SensorClientTest, AServiceThatCannotBeLinkedIsRefusedWithoutADoubleFree) {
+    auto local = ndk::SharedRefBase::make<vyr_binder_test::TestService>();
+    SensorClient client(RangeSettings(), &recorder_, QuickPolicy());
+    EXPECT_EQ(client.Start(local), SensorClient::kNotAttached);
+    EXPECT_EQ(client.state(), SensorClient::State::kIdle);
+    EXPECT_EQ(client.Start(local), SensorClient::kNotAttached);
+}
+
+// Without a pool no notice would ever reach the client: Start says so instead of attaching.
+TEST_F(SensorClientTest, StartWithoutABinderThreadPoolIsRefused) {
+    auto fake = StartFake();
+    // The runtime starts afresh, with no pool, on the next call.
+    VyrBinder_shutdown();
+    std::shared_ptr<IVYRService> service = Service();
+    ASSERT_NE(service, nullptr);
+    ASSERT_FALSE(ABinderProcess_isThreadPoolStarted());
+    SensorClient client(RangeSettings(), &recorder_, QuickPolicy());
+    EXPECT_EQ(client.Start(service), SensorClient::kNoThreadPool);
+    EXPECT_EQ(client.state(), SensorClient::State::kIdle);
+    ABinderProcess_startThreadPool();
+    ASSERT_EQ(client.Start(service), 0);
+    ExpectCalls(fake.get(), AttachCalls(1));
+}
+
+// Each registration notice hands over its own reference: after ten restarts the client holds
+// the proxy of the instance it is attached to, and nothing else.
+TEST_F(SensorClientTest, TenRestartsLeaveOneProxyAlive) {
+    auto fake = StartFake();
+    SensorClient client(RangeSettings(), &recorder_, QuickPolicy());
+    ASSERT_EQ(client.Start(Service()), 0);
+    for (int restart = 1; restart <= 10; ++restart) {
+        Kill(fake.get());
+        fake = StartFake();
+        ASSERT_TRUE(recorder_.WaitFor([&] {
+            return recorder_.resumed_.size() == static_cast<size_t>(restart);
+        })) << "restart "
+            << restart;
+    }
+    // The service's binder, and the callback's proxies that the dead instances held are gone
+    // with them.
+    const auto deadline = std::chrono::steady_clock::now() + kWait;
+    while (VyrBinder_liveProxyCount() != 1 && std::chrono::steady_clock::now() < deadline) {
+        std::this_thread::sleep_for(milliseconds(10));
+    }
+    EXPECT_EQ(VyrBinder_liveProxyCount(), 1);
+    client.Stop();
 }
 
 // vyrctl stream on the real service, across a restart of it.

@@ -12,8 +12,10 @@
 // again after a growing delay, and given up after ReattachPolicy::max_refusals refusals.
 //
 // Threading:
-// - The process must run a binder thread pool (ABinderProcess_startThreadPool): the service's
-//   death notice, and the events of a callback client, arrive on its threads.
+// - The process must run a binder thread pool (ABinderProcess_startThreadPool) before Start:
+//   the service's death notice, its registration notices and the events of a callback client
+//   arrive on the pool's threads only, and a process without a pool would never learn that the
+//   service died. Start refuses with kNoThreadPool otherwise.
 // - OnEvent runs on a binder thread, one event at a time.
 // - OnSettingRefused runs on the thread of Start for the first attach; every other listener
 //   call (lost, refused, resumed, gave up, and OnSettingRefused on a re-attach) runs on the
@@ -87,6 +89,8 @@ class SensorClient {
     // Poll's answer while no handle is open in a live service (-ENOTCONN); Start's when the
     // service is unreachable.
     static constexpr int32_t kNotAttached = -107;
+    // Start's answer when the process runs no binder thread pool (-EAGAIN): start it first.
+    static constexpr int32_t kNoThreadPool = -11;
     static constexpr char kServiceName[] = "vyrservice";
 
     // `listener` must outlive the client.
@@ -97,8 +101,8 @@ class SensorClient {
     SensorClient& operator=(const SensorClient&) = delete;
 
     // Attaches to `service`: 0 and the client keeps the settings in force from now on, or the
-    // result code of the call that failed (Open's -1, -19, ..., or kNotAttached), with nothing
-    // left open. Only from kIdle (again after a failed Start).
+    // result code of the call that failed (Open's -1, -19, ..., or kNotAttached), or
+    // kNoThreadPool, with nothing left open. Only from kIdle (again after a failed Start).
     int32_t Start(std::shared_ptr<aidl::android::vyr::IVYRService> service);
     // Disables and closes the handle and ends the client's thread; the client stays stopped.
     void Stop();

@@ -101,8 +101,15 @@ binder_status_t AIBinder_dump(AIBinder* binder, int fd, const char** args, uint3
 binder_status_t AIBinder_linkToDeath(AIBinder* binder, AIBinder_DeathRecipient* recipient,
                                      void* cookie) {
     if (binder == nullptr || recipient == nullptr) return STATUS_UNEXPECTED_NULL;
-    binder_status_t status = binder->LinkToDeath(recipient->state, cookie);
-    if (status == STATUS_OK) recipient->state->Remember(binder);
+    const vyr_binder::DeathLink link{recipient->state, cookie, recipient->state->on_unlinked()};
+    binder_status_t status = binder->LinkToDeath(link);
+    if (status == STATUS_OK) {
+        recipient->state->Remember(binder);
+    } else {
+        // A link that was never made is reported unlinked before the call returns, as on a
+        // device: the caller frees its cookie there, and only there.
+        link.Unlinked();
+    }
     return status;
 }
 

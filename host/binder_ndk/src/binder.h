@@ -20,6 +20,7 @@ struct AIBinder_Class {
 namespace vyr_binder {
 
 class DeathRecipientState;
+struct DeathLink;
 
 // Strong and weak counts of one binder. The binder dies when the strong count reaches zero and
 // never comes back; the block itself lives while weak references remain.
@@ -78,8 +79,7 @@ struct AIBinder {
     virtual binder_status_t Transact(transaction_code_t code, AParcel* in, AParcel* out,
                                      binder_flags_t flags) = 0;
     virtual binder_status_t Dump(int fd, const char** args, uint32_t num_args) = 0;
-    virtual binder_status_t LinkToDeath(std::shared_ptr<vyr_binder::DeathRecipientState> recipient,
-                                        void* cookie) = 0;
+    virtual binder_status_t LinkToDeath(const vyr_binder::DeathLink& link) = 0;
     virtual binder_status_t UnlinkToDeath(
         const std::shared_ptr<vyr_binder::DeathRecipientState>& recipient, void* cookie) = 0;
     // Removes every link of this recipient, for a recipient being deleted.

@@ -28,16 +28,23 @@ namespace {
 constexpr uint64_t kContextObject = 0;
 constexpr transaction_code_t kLookupCode = 1;
 constexpr size_t kMaxKeyBytes = 128;
-// Calls of one peer received and not yet answered (queued oneway calls included), and their
-// bytes; a peer with more is dropped.
-constexpr uint32_t kMaxCallsInFlight = 1024;
-constexpr size_t kMaxCallBytesInFlight = 16u << 20;
 // How long a frame that carries a descriptor waits for room in the socket.
 constexpr std::chrono::seconds kDescriptorSendWait{5};
 
 Looper& TheLooper() {
     return ProcessState::Get().looper();
 }
+
+// The proxies of a dead peer, weakly held until their notices have run (or were dropped).
+struct WeakProxies {
+    WeakProxies() = default;
+    WeakProxies(const WeakProxies&) = delete;
+    WeakProxies& operator=(const WeakProxies&) = delete;
+    ~WeakProxies() {
+        for (RefCounts* ref : refs) ref->DecWeak();
+    }
+    std::vector<RefCounts*> refs;
+};
 
 }  // namespace
 
@@ -409,29 +416,21 @@ void Connection::FlushPending() {
     }
 }
 
-bool Connection::AdmitCall(const Incoming& call) {
-    const uint32_t calls = calls_in_flight_.fetch_add(1, std::memory_order_relaxed) + 1;
-    const size_t bytes =
-        call_bytes_in_flight_.fetch_add(call.data->data.size(), std::memory_order_relaxed) +
-        call.data->data.size();
-    if (calls <= kMaxCallsInFlight && bytes <= kMaxCallBytesInFlight) return true;
-    CallServed(call);
-    fprintf(stderr, "binder: dropping peer %d: over %u calls or %zu bytes of calls waiting\n",
-            peer_pid_, kMaxCallsInFlight, kMaxCallBytesInFlight);
-    return false;
-}
-
-void Connection::CallServed(const Incoming& call) {
-    calls_in_flight_.fetch_sub(1, std::memory_order_relaxed);
-    call_bytes_in_flight_.fetch_sub(call.data->data.size(), std::memory_order_relaxed);
+bool Connection::AdmitCall(Incoming* call) {
+    const size_t footprint =
+        TransactionBuffer::Footprint(call->data->data.size(), call->data->objects.size());
+    return TransactionBuffer::Reserve(footprint, (call->flags & FLAG_ONEWAY) != 0, &call->charge);
 }
 
 binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, const AParcel& in,
                                      AParcel* out, binder_flags_t flags, int descriptor) {
-    if (in.data.size() > kMaxTransactionBytes || in.objects.size() > kMaxObjects) {
+    const bool oneway = (flags & FLAG_ONEWAY) != 0;
+    // No process's buffer could take it.
+    if (in.objects.size() > kMaxObjects ||
+        !TransactionBuffer::Fits(TransactionBuffer::Footprint(in.data.size(), in.objects.size()),
+                                 oneway)) {
         return STATUS_FAILED_TRANSACTION;
     }
-    const bool oneway = (flags & FLAG_ONEWAY) != 0;
     Waiter waiter;
     std::vector<WireObject> objects;
     uint64_t id;
@@ -443,11 +442,11 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         binder_status_t status = EncodeObjectsLocked(in, &objects);
         if (status != STATUS_OK) return status;
         id = next_transaction_id_++;
-        if (!oneway) {
-            waiters_.emplace_back(id, &waiter);
-            reader = !reading_;
-            if (reader) TakeReadingRoleLocked();
-        }
+        // A oneway call waits too, for the receiver to say whether its buffer took the call, as
+        // the driver tells a device's sender at once.
+        waiters_.emplace_back(id, &waiter);
+        reader = !reading_;
+        if (reader) TakeReadingRoleLocked();
     }
     uint64_t parent = ScopedCallContext::ParentFor(this);
     if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects, descriptor)) {
@@ -460,7 +459,6 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         Die();
         return STATUS_DEAD_OBJECT;
     }
-    if (oneway) return STATUS_OK;
 
     UniqueLock lock(mutex_);
     while (!waiter.done) {
@@ -516,7 +514,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
     binder_status_t status = waiter.status;
     lock.unlock();
     dropped.clear();
-    if (status == STATUS_OK && reply != nullptr) {
+    if (status == STATUS_OK && reply != nullptr && !oneway) {
         out->data = std::move(reply->data);
         out->objects = std::move(reply->objects);
         out->pos = 0;
@@ -551,7 +549,10 @@ bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out)
         if (!oneway) ServeContextCall(*call);
         return true;
     }
-    if (!AdmitCall(*call)) return false;
+    if (!AdmitCall(call.get())) {
+        SendReply(call->id, STATUS_FAILED_TRANSACTION, AParcel());
+        return true;
+    }
     {
         std::lock_guard<std::mutex> lock(mutex_);
         auto it = exports_.find(header.target);
@@ -566,11 +567,12 @@ bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out)
         }
     }
     if (call->target.get() == nullptr) {
-        CallServed(*call);
-        if (!oneway) SendReply(call->id, STATUS_DEAD_OBJECT, AParcel());
+        SendReply(call->id, STATUS_DEAD_OBJECT, AParcel());
         return true;
     }
     if (oneway) {
+        // The buffer took it: the sender goes on before it is served.
+        SendReply(call->id, STATUS_OK, AParcel());
         // Queued now, while the frames are still taken in order.
         std::shared_ptr<Connection> self = shared_from_this();
         LocalBinder* local = static_cast<LocalBinder*>(call->target.get());
@@ -610,7 +612,10 @@ void Connection::Dispatch(std::shared_ptr<Incoming> call, bool can_serve) {
 }
 
 void Connection::Serve(Incoming& call) {
-    ScopedCallContext context(peer_uid_, peer_pid_, this, call.id);
+    // A device gives no sender pid with a oneway call, and a oneway call is nobody's parent: its
+    // sender waits for nothing.
+    const bool oneway = (call.flags & FLAG_ONEWAY) != 0;
+    ScopedCallContext context(peer_uid_, oneway ? 0 : peer_pid_, this, oneway ? 0 : call.id);
     AParcel reply;
     reply.data.reserve(kSmallParcelBytes);
     call.data->pos = 0;
@@ -618,8 +623,8 @@ void Connection::Serve(Incoming& call) {
         call.code == kDumpTransaction
             ? ServeDump(call)
             : call.target.get()->Transact(call.code, call.data.get(), &reply, call.flags);
-    CallServed(call);
-    if ((call.flags & FLAG_ONEWAY) == 0) SendReply(call.id, status, reply);
+    call.charge = TransactionBuffer::Charge();
+    if (!oneway) SendReply(call.id, status, reply);
 }
 
 binder_status_t Connection::ServeDump(Incoming& call) {
@@ -662,8 +667,11 @@ void Connection::ServeContextCall(Incoming& call) {
 
 void Connection::SendReply(uint64_t id, binder_status_t status, const AParcel& reply) {
     std::vector<WireObject> objects;
+    // The reply goes into the caller's buffer; one that no buffer could take is refused.
     if (status == STATUS_OK &&
-        (reply.data.size() > kMaxTransactionBytes || reply.objects.size() > kMaxObjects)) {
+        (reply.objects.size() > kMaxObjects ||
+         !TransactionBuffer::Fits(
+             TransactionBuffer::Footprint(reply.data.size(), reply.objects.size()), false))) {
         status = STATUS_FAILED_TRANSACTION;
     }
     if (status == STATUS_OK) {
@@ -689,7 +697,7 @@ binder_status_t Connection::Lookup(const std::string& name, ndk::SpAIBinder* bin
 }
 
 void Connection::Die() {
-    std::vector<ndk::SpAIBinder> proxies;
+    auto proxies = std::make_shared<WeakProxies>();
     std::unordered_map<uint64_t, Export> exports;
     {
         std::lock_guard<std::mutex> lock(mutex_);
@@ -702,26 +710,26 @@ void Connection::Die() {
             entry.second->cv.notify_one();
         }
         for (auto& entry : proxies_) {
-            AIBinder* alive = entry.second->refs()->Promote();
-            if (alive != nullptr) proxies.emplace_back(alive);
+            entry.second->refs()->IncWeak();
+            proxies->refs.push_back(entry.second->refs());
         }
         exports.swap(exports_);
     }
     shutdown(fd_, SHUT_RDWR);
-    std::shared_ptr<Connection> self = shared_from_this();
     exports.clear();
-    auto notify = [proxies = std::move(proxies)] {
-        for (const ndk::SpAIBinder& proxy : proxies) {
-            static_cast<ProxyBinder*>(proxy.get())->SendObituaries();
+    // As on a device, death notices are work for the pool: they wait until a pool thread is
+    // free (or exists at all), and never run on a thread that is in a call. A proxy released
+    // before then gets none, as its links went with it.
+    TheLooper().Enqueue([proxies = std::move(proxies)] {
+        for (RefCounts* refs : proxies->refs) {
+            AIBinder* proxy = refs->Promote();
+            if (proxy != nullptr) {
+                static_cast<ProxyBinder*>(proxy)->SendObituaries();
+                proxy->DecStrong();
+            }
         }
-    };
-    // Death notices run on a runtime thread, never on a caller's.
-    if (Looper::OnRuntimeThread()) {
-        notify();
-    } else {
-        TheLooper().RunTask(std::move(notify));
-    }
-    // Last: once no connection is left, every notice has run or has its thread (shutdown).
+    });
+    // Last: once no connection is left, every notice is queued.
     TheLooper().Remove(*this);
 }
 

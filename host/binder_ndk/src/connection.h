@@ -18,6 +18,7 @@
 
 #include "frame_io.h"
 #include "parcel.h"
+#include "transaction_buffer.h"
 #include "unique_lock.h"
 #include "wire.h"
 
@@ -75,6 +76,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
         ndk::SpAIBinder target;
         ndk::ScopedFileDescriptor descriptor;  // a dump request's output
         bool drain_oneway = false;             // run the target's queued oneway calls instead
+        // Its share of this process's transaction buffer, held until it has been served.
+        TransactionBuffer::Charge charge;
     };
     // A thread waiting for the reply to one of its transactions.
     struct Waiter {
@@ -133,9 +136,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
     // Sends what the socket would not take at once, on a runtime thread, as the peer reads.
     void FlushPending();
-    // Counts a received call until it has been served; false when the peer has too many.
-    bool AdmitCall(const Incoming& call);
-    void CallServed(const Incoming& call);
+    // Takes the call's share of the transaction buffer; false when it does not fit.
+    bool AdmitCall(Incoming* call);
 
     const int fd_;
     uint64_t serial_ = 0;
@@ -151,9 +153,6 @@ class Connection : public std::enable_shared_from_this<Connection> {
     bool flushing_ GUARDED_BY(send_mutex_) = false;
     // Set once the peer let too much pile up; the connection is on its way out.
     bool send_refused_ GUARDED_BY(send_mutex_) = false;
-    // Calls received and not yet answered, and their bytes: what a flooding peer holds here.
-    std::atomic<uint32_t> calls_in_flight_{0};
-    std::atomic<size_t> call_bytes_in_flight_{0};
 
     std::mutex mutex_;
     uint64_t next_transaction_id_ GUARDED_BY(mutex_) = 1;

@@ -52,12 +52,6 @@ void DeathRecipientState::NotifyDied(void* cookie) const {
     if (!deleted() && on_died_ != nullptr) on_died_(cookie);
 }
 
-void DeathRecipientState::NotifyUnlinked(void* cookie) const {
-    AIBinder_DeathRecipient_onBinderUnlinked on_unlinked =
-        on_unlinked_.load(std::memory_order_acquire);
-    if (on_unlinked != nullptr) on_unlinked(cookie);
-}
-
 }  // namespace vyr_binder
 
 AIBinder_DeathRecipient* AIBinder_DeathRecipient_new(

@@ -23,6 +23,9 @@ class DeathRecipientState {
     void SetOnUnlinked(AIBinder_DeathRecipient_onBinderUnlinked on_unlinked) {
         on_unlinked_.store(on_unlinked, std::memory_order_release);
     }
+    AIBinder_DeathRecipient_onBinderUnlinked on_unlinked() const {
+        return on_unlinked_.load(std::memory_order_acquire);
+    }
     // Records a binder this recipient was linked to, so deletion can unlink it.
     void Remember(AIBinder* binder);
     // Unlinks from every remembered binder; no notice is delivered after this returns.
@@ -30,7 +33,6 @@ class DeathRecipientState {
 
     bool deleted() const { return deleted_.load(std::memory_order_acquire); }
     void NotifyDied(void* cookie) const;
-    void NotifyUnlinked(void* cookie) const;
 
   private:
     const AIBinder_DeathRecipient_onBinderDied on_died_;
@@ -40,10 +42,18 @@ class DeathRecipientState {
     std::vector<RefCounts*> binders_ GUARDED_BY(mutex_);  // weak references
 };
 
-// One link: a recipient and the cookie it was linked with.
+// One link: a recipient, the cookie it was linked with, and the recipient's onUnlinked as it was
+// when the link was made (a device captures it then; a later setOnUnlinked does not reach it).
 struct DeathLink {
     std::shared_ptr<DeathRecipientState> recipient;
     void* cookie;
+    AIBinder_DeathRecipient_onBinderUnlinked on_unlinked;
+
+    void Died() const { recipient->NotifyDied(cookie); }
+    // Once per link: after its notice, on an unlink, or when the link could not be made.
+    void Unlinked() const {
+        if (on_unlinked != nullptr) on_unlinked(cookie);
+    }
 };
 
 }  // namespace vyr_binder

@@ -50,8 +50,7 @@ binder_status_t LocalBinder::Dump(int fd, const char** args, uint32_t num_args) 
     return clazz->on_dump(this, fd, args, num_args);
 }
 
-binder_status_t LocalBinder::LinkToDeath(std::shared_ptr<DeathRecipientState> /*recipient*/,
-                                         void* /*cookie*/) {
+binder_status_t LocalBinder::LinkToDeath(const DeathLink& /*link*/) {
     return STATUS_INVALID_OPERATION;
 }
 

@@ -26,8 +26,7 @@ class LocalBinder : public AIBinder {
                              binder_flags_t flags) override;
     binder_status_t Dump(int fd, const char** args, uint32_t num_args) override;
     // A local binder cannot die while this process runs.
-    binder_status_t LinkToDeath(std::shared_ptr<DeathRecipientState> recipient,
-                                void* cookie) override;
+    binder_status_t LinkToDeath(const DeathLink& link) override;
     binder_status_t UnlinkToDeath(const std::shared_ptr<DeathRecipientState>& recipient,
                                   void* cookie) override;
     void DropLinksOf(const DeathRecipientState* /*recipient*/) override {}

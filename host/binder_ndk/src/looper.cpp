@@ -123,7 +123,7 @@ void Looper::AfterServingInline() {
 
 void Looper::RunTask(std::function<void()> task) {
     std::lock_guard<std::mutex> lock(mutex_);
-    // Tasks are rare (a peer died while only a caller was reading); reap the finished ones.
+    // Tasks are rare (a peer that does not take what is sent to it); reap the finished ones.
     for (auto it = tasks_.begin(); it != tasks_.end();) {
         if (*it->second) {
             it->first.join();
@@ -150,7 +150,11 @@ void Looper::Run(Kind kind) {
         if (executor && !queue_.empty()) {
             std::function<void()> work = std::move(queue_.front());
             queue_.pop_front();
-            if (!queue_.empty()) ArmWorkLocked();
+            if (!queue_.empty()) {
+                ArmWorkLocked();
+            } else {
+                cv_.notify_all();  // Shutdown waits for the queue to empty
+            }
             ++serving_;
             lock.unlock();
             work();
@@ -242,7 +246,11 @@ void Looper::Shutdown() {
     std::vector<std::pair<std::thread, std::shared_ptr<bool>>> tasks;
     std::deque<std::function<void()>> dropped;
     {
-        std::lock_guard<std::mutex> lock(mutex_);
+        UniqueLock lock(mutex_);
+        // Queued work, death notices among it, is done first when a pool thread can do it;
+        // without a pool it is dropped, as a device process that never had one never saw it.
+        cv_.wait(lock.native(),
+                 [this]() REQUIRES(mutex_) { return queue_.empty() || !HaveExecutorsLocked(); });
         stopping_ = true;
         uint64_t one = 1;
         ssize_t written = write(stop_fd_, &one, sizeof(one));

@@ -24,8 +24,8 @@ class Connection;
 // the thread that served the last call serves the next one, warm, instead of the pool taking
 // turns, and no thread wakes while nothing happens. The looper
 // thread exists from the first connection on; until the pool is started (or a thread joins it) it
-// handles replies, reference counts and deaths but leaves incoming calls queued, as a device
-// process without a thread pool would.
+// handles replies and reference counts but leaves incoming calls, death notices and registration
+// notices queued, as a device process without a thread pool would.
 class Looper {
   public:
     static constexpr uint32_t kDefaultMaxThreads = 15;
@@ -45,7 +45,7 @@ class Looper {
     // another is started so that someone still reads.
     void BeforeServingInline();
     void AfterServingInline();
-    // Runs `task` on a runtime thread now, pool or not (death notices).
+    // Runs `task` on a runtime thread of its own now, pool or not (the runtime's own sending).
     void RunTask(std::function<void()> task);
 
     // Adds the connection disarmed; the connection arms itself.

@@ -1,7 +1,11 @@
 #include "proxy_binder.h"
 
 #include <fcntl.h>
+#include <vyr/binder_host.h>
 
+#include <atomic>
+#include <iterator>
+#include <optional>
 #include <utility>
 
 #include "connection.h"
@@ -9,16 +13,24 @@
 #include "parcel.h"
 
 namespace vyr_binder {
+namespace {
+
+std::atomic<int> g_live_proxies{0};
+
+}  // namespace
 
 ProxyBinder::ProxyBinder(std::shared_ptr<Connection> connection, uint64_t remote_id,
                          std::string descriptor)
     : AIBinder(nullptr),
       connection_(std::move(connection)),
       remote_id_(remote_id),
-      descriptor_(std::move(descriptor)) {}
+      descriptor_(std::move(descriptor)) {
+    g_live_proxies.fetch_add(1, std::memory_order_relaxed);
+}
 
 ProxyBinder::~ProxyBinder() {
     connection_->ForgetProxy(this);
+    g_live_proxies.fetch_sub(1, std::memory_order_relaxed);
 }
 
 bool ProxyBinder::IsAlive() const {
@@ -40,37 +52,34 @@ binder_status_t ProxyBinder::Dump(int fd, const char** args, uint32_t num_args) 
     return connection_->Transact(remote_id_, kDumpTransaction, in, &out, 0, fd);
 }
 
-binder_status_t ProxyBinder::LinkToDeath(std::shared_ptr<DeathRecipientState> recipient,
-                                         void* cookie) {
+binder_status_t ProxyBinder::LinkToDeath(const DeathLink& link) {
     std::lock_guard<std::mutex> lock(mutex_);
-    if (obituaries_sent_ || connection_->dead()) return STATUS_DEAD_OBJECT;
-    links_.push_back(DeathLink{std::move(recipient), cookie});
+    // A death not yet reported still reaches a link made now, as on a device, where the driver
+    // answers a link to a dead object with its notice.
+    if (obituaries_sent_) return STATUS_DEAD_OBJECT;
+    links_.push_back(link);
     return STATUS_OK;
 }
 
 binder_status_t ProxyBinder::UnlinkToDeath(const std::shared_ptr<DeathRecipientState>& recipient,
                                            void* cookie) {
-    std::vector<DeathLink> removed;
+    std::optional<DeathLink> removed;
     {
         std::lock_guard<std::mutex> lock(mutex_);
+        // While the notices run the link is still being reported; once they have run, it is
+        // gone.
+        if (obituaries_done_) return STATUS_NAME_NOT_FOUND;
         if (obituaries_sent_) return STATUS_DEAD_OBJECT;
-        bool exact = false;
-        for (const DeathLink& link : links_) {
-            if (link.recipient == recipient && link.cookie == cookie) exact = true;
-        }
-        for (auto it = links_.begin(); it != links_.end();) {
-            bool match = it->recipient == recipient && (it->cookie == cookie || !exact);
-            if (match && (exact || cookie == nullptr)) {
-                removed.push_back(std::move(*it));
-                it = links_.erase(it);
-                if (exact) break;
-            } else {
-                ++it;
+        for (auto it = links_.rbegin(); it != links_.rend(); ++it) {
+            if (it->recipient == recipient && it->cookie == cookie) {
+                removed = std::move(*it);
+                links_.erase(std::next(it).base());
+                break;
             }
         }
     }
-    if (removed.empty()) return STATUS_NAME_NOT_FOUND;
-    for (const DeathLink& link : removed) link.recipient->NotifyUnlinked(link.cookie);
+    if (!removed) return STATUS_NAME_NOT_FOUND;
+    removed->Unlinked();
     return STATUS_OK;
 }
 
@@ -87,7 +96,7 @@ void ProxyBinder::DropLinksOf(const DeathRecipientState* recipient) {
             }
         }
     }
-    for (const DeathLink& link : removed) link.recipient->NotifyUnlinked(link.cookie);
+    for (const DeathLink& link : removed) link.Unlinked();
 }
 
 void ProxyBinder::SendObituaries() {
@@ -99,9 +108,15 @@ void ProxyBinder::SendObituaries() {
         links.swap(links_);
     }
     for (const DeathLink& link : links) {
-        link.recipient->NotifyDied(link.cookie);
-        link.recipient->NotifyUnlinked(link.cookie);
+        link.Died();
+        link.Unlinked();
     }
+    std::lock_guard<std::mutex> lock(mutex_);
+    obituaries_done_ = true;
 }
 
 }  // namespace vyr_binder
+
+int VyrBinder_liveProxyCount(void) {
+    return vyr_binder::g_live_proxies.load(std::memory_order_relaxed);
+}

@@ -27,15 +27,14 @@ class ProxyBinder : public AIBinder {
     binder_status_t Transact(transaction_code_t code, AParcel* in, AParcel* out,
                              binder_flags_t flags) override;
     binder_status_t Dump(int fd, const char** args, uint32_t num_args) override;
-    binder_status_t LinkToDeath(std::shared_ptr<DeathRecipientState> recipient,
-                                void* cookie) override;
-    // With a null cookie and no link made with a null cookie, every link of the recipient on
-    // this binder is removed.
+    binder_status_t LinkToDeath(const DeathLink& link) override;
+    // Removes the newest link made with this recipient and this very cookie (a null cookie
+    // matches only a link made with a null one).
     binder_status_t UnlinkToDeath(const std::shared_ptr<DeathRecipientState>& recipient,
                                   void* cookie) override;
     void DropLinksOf(const DeathRecipientState* recipient) override;
 
-    // Called once, when the connection dies: every link fires exactly once.
+    // Called once, on a pool thread, after the connection died: every link fires exactly once.
     void SendObituaries();
 
     const std::shared_ptr<Connection>& connection() const { return connection_; }
@@ -51,6 +50,8 @@ class ProxyBinder : public AIBinder {
     const std::string descriptor_;
     std::mutex mutex_;
     bool obituaries_sent_ GUARDED_BY(mutex_) = false;
+    // Every notice has run; the links are gone.
+    bool obituaries_done_ GUARDED_BY(mutex_) = false;
     std::vector<DeathLink> links_ GUARDED_BY(mutex_);
 };
 

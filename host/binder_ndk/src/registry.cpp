@@ -119,13 +119,16 @@ binder_exception_t Registry::Publish(const std::string& dir, const std::string& 
     std::string current;
     if (ReadKey(entry, &current) && current != key) {
         if (IsAlive(dir, current)) {
-            fprintf(stderr, "binder: service %s is already published by %s\n", name.c_str(),
-                    current.c_str());
-            return EX_ILLEGAL_STATE;
+            // servicemanager overwrites a registration too, and says so in its log.
+            fprintf(stderr,
+                    "binder: service '%s' originally registered by %s is being registered again "
+                    "by %s\n",
+                    name.c_str(), current.c_str(), key.c_str());
+        } else {
+            // Left behind by a process that died without cleaning up.
+            unlink(SocketPath(dir, current).c_str());
+            unlink(LockPath(dir, current).c_str());
         }
-        // Left behind by a process that died without cleaning up.
-        unlink(SocketPath(dir, current).c_str());
-        unlink(LockPath(dir, current).c_str());
     }
     std::string temp = entry + ".tmp." + key;
     unlink(temp.c_str());

@@ -20,7 +20,8 @@ class Registry {
     static std::string SocketPath(const std::string& dir, const std::string& key);
     static std::string LockPath(const std::string& dir, const std::string& key);
 
-    // Points the name at `key`. EX_ILLEGAL_STATE when another live process holds it.
+    // Points the name at `key`, in place of any earlier registration. EX_ILLEGAL_STATE when the
+    // registry cannot be written.
     static binder_exception_t Publish(const std::string& dir, const std::string& name,
                                       const std::string& key);
     // Removes the name if it still points at `key`.

@@ -7,6 +7,7 @@
 
 #include "process_state.h"
 #include "registry.h"
+#include "service_notification.h"
 
 namespace {
 
@@ -26,11 +27,11 @@ AIBinder* Released(ndk::SpAIBinder binder) {
 // The first binder reported for a name.
 struct Waiter {
     static void OnRegister(const char* /*instance*/, AIBinder* registered, void* cookie) {
+        ndk::SpAIBinder owned(registered);
         auto* waiter = static_cast<Waiter*>(cookie);
         std::lock_guard<std::mutex> lock(waiter->mutex);
         if (waiter->binder.get() != nullptr) return;
-        AIBinder_incStrong(registered);
-        waiter->binder.set(registered);
+        waiter->binder = std::move(owned);
         waiter->found.notify_all();
     }
     std::mutex mutex;
@@ -38,12 +39,13 @@ struct Waiter {
     ndk::SpAIBinder binder;
 };
 
-// Woken by the registration itself rather than by looking again and again.
+// Woken by the registration itself rather than by looking again and again. A device needs no
+// pool here either: its waitForService looks again every second when no notice comes.
 AIBinder* LookupUntil(const char* instance, bool forever) {
     if (instance == nullptr || !Registry::IsValidName(instance)) return nullptr;
     Waiter waiter;
     AServiceManager_NotificationRegistration* registration =
-        AServiceManager_registerForServiceNotifications(instance, &Waiter::OnRegister, &waiter);
+        vyr_binder::RegisterForNoticesWithoutPool(instance, &Waiter::OnRegister, &waiter);
     if (registration == nullptr) return nullptr;
     ndk::SpAIBinder binder;
     {

@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <climits>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 
 #include "process_state.h"
@@ -16,16 +17,40 @@
 using vyr_binder::ProcessState;
 using vyr_binder::Registry;
 
+namespace {
+
+// The registration whose notice this thread is running, if any.
+thread_local const void* t_notice_of = nullptr;
+
+}  // namespace
+
 AServiceManager_NotificationRegistration::AServiceManager_NotificationRegistration(
-    std::string name, AServiceManager_onRegister callback, void* cookie)
-    : name_(std::move(name)), callback_(callback), cookie_(cookie) {}
+    const char* instance, AServiceManager_onRegister callback, void* cookie, bool on_pool)
+    : name_(instance), on_pool_(on_pool), notices_(std::make_shared<Notices>()) {
+    notices_->instance = instance;
+    std::lock_guard<std::mutex> lock(notices_->mutex);
+    notices_->callback = callback;
+    notices_->cookie = cookie;
+}
 
 AServiceManager_NotificationRegistration::~AServiceManager_NotificationRegistration() {
+    if (t_notice_of == notices_.get()) {
+        // The registration's lock is held by this very thread: a device deadlocks here.
+        fprintf(stderr,
+                "binder: AServiceManager_NotificationRegistration_delete of %s from its own "
+                "notice deadlocks on a device\n",
+                name_.c_str());
+        abort();
+    }
     if (thread_.joinable()) {
         const uint64_t one = 1;
         (void)!write(wake_fd_.get(), &one, sizeof(one));
         thread_.join();
     }
+    // Waits for a notice that is running; queued ones find no callback.
+    std::lock_guard<std::mutex> lock(notices_->mutex);
+    notices_->callback = nullptr;
+    notices_->cookie = nullptr;
 }
 
 bool AServiceManager_NotificationRegistration::Start() {
@@ -46,28 +71,53 @@ bool AServiceManager_NotificationRegistration::Start() {
     return true;
 }
 
-void AServiceManager_NotificationRegistration::Delete() {
-    if (thread_.joinable() && thread_.get_id() == std::this_thread::get_id()) {
-        delete_on_return_ = true;
-        return;
+void AServiceManager_NotificationRegistration::Notify(ndk::SpAIBinder binder) {
+    {
+        std::lock_guard<std::mutex> lock(notices_->queue_mutex);
+        notices_->queue.push_back(std::move(binder));
+        if (notices_->draining) return;
+        notices_->draining = true;
     }
-    delete this;
+    if (on_pool_) {
+        ProcessState::Get().looper().Enqueue([notices = notices_] { notices->Drain(); });
+    } else {
+        notices_->Drain();
+    }
+}
+
+void AServiceManager_NotificationRegistration::Notices::Drain() {
+    while (true) {
+        ndk::SpAIBinder binder;
+        {
+            std::lock_guard<std::mutex> lock(queue_mutex);
+            if (queue.empty()) {
+                draining = false;
+                return;
+            }
+            binder = std::move(queue.front());
+            queue.pop_front();
+        }
+        std::lock_guard<std::mutex> lock(mutex);
+        if (callback == nullptr) continue;
+        t_notice_of = this;
+        // The notice owns the reference it is given.
+        AIBinder* owned = binder.get();
+        *binder.getR() = nullptr;
+        callback(instance, owned, cookie);
+        t_notice_of = nullptr;
+    }
 }
 
 void AServiceManager_NotificationRegistration::Run() {
     const std::string entry = Registry::EntryFileName(name_);
-    // Held so that a new registration is told apart from the one last reported.
-    ndk::SpAIBinder reported;
-    const auto report = [&] {
+    const auto report = [this] {
         ndk::SpAIBinder binder = ProcessState::Get().Lookup(name_);
-        if (binder.get() == nullptr || binder.get() == reported.get()) return true;
-        reported = binder;
-        callback_(name_.c_str(), binder.get(), cookie_);
-        return !delete_on_return_;
+        if (binder.get() != nullptr) Notify(std::move(binder));
     };
     // The watch is in place before this first look, so no registration falls between them.
-    bool go_on = report();
+    report();
     alignas(inotify_event) char buffer[sizeof(inotify_event) + NAME_MAX + 1];
+    bool go_on = true;
     while (go_on) {
         pollfd fds[2] = {{inotify_fd_.get(), POLLIN, 0}, {wake_fd_.get(), POLLIN, 0}};
         if (poll(fds, 2, -1) < 0) {
@@ -76,34 +126,34 @@ void AServiceManager_NotificationRegistration::Run() {
             break;
         }
         if (fds[1].revents != 0) break;
-        bool changed = false;
+        int registrations = 0;
         ssize_t got;
         while ((got = read(inotify_fd_.get(), buffer, sizeof(buffer))) > 0) {
             for (ssize_t at = 0; at < got;) {
                 inotify_event event;
                 memcpy(&event, buffer + at, sizeof(event));
                 const char* event_name = buffer + at + sizeof(event);
-                if (event.len > 0 && entry == event_name) changed = true;
+                if (event.len > 0 && entry == event_name) ++registrations;
                 // The whole registry was removed: nothing can be registered in it any more.
                 if (event.mask & IN_IGNORED) go_on = false;
                 at += static_cast<ssize_t>(sizeof(event) + event.len);
             }
         }
-        if (changed && go_on) go_on = report();
-    }
-    if (delete_on_return_) {
-        // Deleted from its own notice: nobody joins this thread.
-        thread_.detach();
-        delete this;
+        // A device sends a notice for every registration, of the same binder too.
+        for (int i = 0; i < registrations && go_on; ++i) report();
     }
 }
 
-AServiceManager_NotificationRegistration* AServiceManager_registerForServiceNotifications(
-    const char* instance, AServiceManager_onRegister onRegister, void* cookie) {
+namespace {
+
+AServiceManager_NotificationRegistration* Register(const char* instance,
+                                                   AServiceManager_onRegister onRegister,
+                                                   void* cookie, bool on_pool) {
     if (instance == nullptr || onRegister == nullptr || !Registry::IsValidName(instance)) {
         return nullptr;
     }
-    auto* registration = new AServiceManager_NotificationRegistration(instance, onRegister, cookie);
+    auto* registration =
+        new AServiceManager_NotificationRegistration(instance, onRegister, cookie, on_pool);
     if (!registration->Start()) {
         delete registration;
         return nullptr;
@@ -111,7 +161,19 @@ AServiceManager_NotificationRegistration* AServiceManager_registerForServiceNoti
     return registration;
 }
 
+}  // namespace
+
+AServiceManager_NotificationRegistration* vyr_binder::RegisterForNoticesWithoutPool(
+    const char* instance, AServiceManager_onRegister callback, void* cookie) {
+    return Register(instance, callback, cookie, false);
+}
+
+AServiceManager_NotificationRegistration* AServiceManager_registerForServiceNotifications(
+    const char* instance, AServiceManager_onRegister onRegister, void* cookie) {
+    return Register(instance, onRegister, cookie, true);
+}
+
 void AServiceManager_NotificationRegistration_delete(
     AServiceManager_NotificationRegistration* notification) {
-    if (notification != nullptr) notification->Delete();
+    delete notification;
 }

@@ -9,4 +9,8 @@ __BEGIN_DECLS
 // The runtime starts afresh on the next binder call. Must not be called from a runtime thread.
 void VyrBinder_shutdown(void);
 
+// Host runtime only: how many proxies (binders of other processes) this process holds now, so
+// that tests can tell a leaked reference.
+int VyrBinder_liveProxyCount(void);
+
 __END_DECLS
