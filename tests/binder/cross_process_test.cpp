@@ -28,124 +28,23 @@
 #include "binder_test_env.h"
 #include "echo_binder.h"
 #include "frame_io.h"
+#include "process_fixture.h"
 #include "raw_peer.h"
 #include "test_service.h"
 #include "thread_count.h"
 #include "wire.h"
-
-extern char** environ;
 
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 using aidl::android::vyr::IVYRService;
+using vyr_binder_test::CrossProcessTest;
+using vyr_binder_test::DeathLog;
+using vyr_binder_test::Eventually;
 using vyr_binder_test::RecordingCallback;
 using vyr_binder_test::TestService;
 using namespace std::chrono_literals;
-
-// Death notices as the runtime delivered them: cookie and thread.
-class DeathLog {
-  public:
-    static DeathLog& Get() {
-        static DeathLog* log = new DeathLog;
-        return *log;
-    }
-    static void OnDied(void* cookie) {
-        DeathLog& log = Get();
-        std::lock_guard<std::mutex> lock(log.mutex_);
-        log.notices_.emplace_back(cookie, std::this_thread::get_id());
-        log.cv_.notify_all();
-    }
-    void Clear() {
-        std::lock_guard<std::mutex> lock(mutex_);
-        notices_.clear();
-    }
-    bool WaitFor(size_t count, std::chrono::milliseconds timeout = 10s) {
-        std::unique_lock<std::mutex> lock(mutex_);
-        return cv_.wait_for(lock, timeout, [&] { return notices_.size() >= count; });
-    }
-    std::vector<std::pair<void*, std::thread::id>> notices() {
-        std::lock_guard<std::mutex> lock(mutex_);
-        return notices_;
-    }
-    size_t CountOf(void* cookie) {
-        size_t n = 0;
-        for (const auto& notice : notices()) n += notice.first == cookie ? 1 : 0;
-        return n;
-    }
-
-  private:
-    std::mutex mutex_;
-    std::condition_variable cv_;
-    std::vector<std::pair<void*, std::thread::id>> notices_;
-};
-
-template <typename Predicate>
-bool Eventually(Predicate predicate, std::chrono::milliseconds timeout = 10s) {
-    auto deadline = std::chrono::steady_clock::now() + timeout;
-    while (!predicate()) {
-        if (std::chrono::steady_clock::now() > deadline) return false;
-        std::this_thread::sleep_for(5ms);
-    }
-    return true;
-}
-
-class CrossProcessTest : public ::testing::Test {
-  protected:
-    void SetUp() override {
-        ASSERT_FALSE(registry_.path().empty());
-        DeathLog::Get().Clear();
-        ABinderProcess_startThreadPool();
-    }
-
-    void TearDown() override {
-        for (pid_t pid : children_) Kill(pid);
-        VyrBinder_shutdown();
-    }
-
-    pid_t Spawn(const std::string& mode, const std::string& name) {
-        std::string helper = BINDER_TEST_HELPER;
-        std::vector<char*> argv = {helper.data(), const_cast<char*>(mode.c_str()),
-                                   const_cast<char*>(name.c_str()), nullptr};
-        pid_t pid = -1;
-        if (posix_spawn(&pid, helper.c_str(), nullptr, nullptr, argv.data(), environ) != 0) {
-            return -1;
-        }
-        children_.push_back(pid);
-        return pid;
-    }
-
-    void Kill(pid_t pid) {
-        for (auto it = children_.begin(); it != children_.end(); ++it) {
-            if (*it == pid) {
-                kill(pid, SIGKILL);
-                waitpid(pid, nullptr, 0);
-                children_.erase(it);
-                return;
-            }
-        }
-    }
-
-    ndk::SpAIBinder WaitForService(const std::string& name) {
-        ndk::SpAIBinder binder;
-        Eventually([&] {
-            binder.set(AServiceManager_checkService(name.c_str()));
-            return binder.get() != nullptr;
-        });
-        return binder;
-    }
-
-    // Starts a helper serving a TestService as `name`.
-    std::shared_ptr<IVYRService> StartServer(const std::string& name, pid_t* pid = nullptr) {
-        pid_t child = Spawn("serve", name);
-        if (pid != nullptr) *pid = child;
-        return IVYRService::fromBinder(WaitForService(name));
-    }
-
-    vyr_binder_test::ScopedRegistryDir registry_;
-    std::vector<pid_t> children_;
-};
 
 TEST_F(CrossProcessTest, CallsReachTheOtherProcess) {
     std::shared_ptr<IVYRService> service = StartServer("vyr.test");
@@ -297,19 +196,6 @@ TEST_F(CrossProcessTest, OneAIBinderPerObjectAndOwnObjectsComeBackLocal) {
     EXPECT_EQ(nullptr, roundtrip(nullptr).get());
 }
 
-TEST_F(CrossProcessTest, NestedCallbacksDuringACallDoNotDeadlock) {
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
-    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
-    int32_t result = 0;
-    // The service calls OnEvent three times while this thread waits for SetCallback's reply.
-    ASSERT_TRUE(service->SetCallback(3, callback, &result).isOk());
-    EXPECT_EQ(3, result);
-    std::vector<Event> events = callback->events();
-    ASSERT_EQ(3u, events.size());
-    EXPECT_EQ(2, events[2].status);
-    EXPECT_EQ(std::vector<float>(2, 0.5f), events[2].data);
-}
-
 TEST_F(CrossProcessTest, CallbackIsCalledLaterFromAnotherThread) {
     std::shared_ptr<IVYRService> service = StartServer("vyr.test");
     auto callback = ndk::SharedRefBase::make<RecordingCallback>();
@@ -339,213 +225,6 @@ TEST_F(CrossProcessTest, ExportedObjectLivesWhileThePeerHoldsIt) {
     ASSERT_TRUE(service->SetCallback(0, nullptr, &result).isOk());
     EXPECT_EQ(-22, result);
     EXPECT_TRUE(Eventually([&] { return weak.expired(); }));
-}
-
-TEST_F(CrossProcessTest, PeerDeathNotifiesEveryLinkOnceWithItsCookie) {
-    pid_t pid = -1;
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
-    ASSERT_NE(nullptr, service);
-    AIBinder* binder = service->asBinder().get();
-    ndk::ScopedAIBinder_DeathRecipient first(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    ndk::ScopedAIBinder_DeathRecipient second(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    int cookies[3];
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, first.get(), &cookies[0]));
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, first.get(), &cookies[1]));
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, second.get(), &cookies[2]));
-    ndk::SpAIBinder echo = WaitForService("vyr.test.echo");
-
-    Kill(pid);
-    ASSERT_TRUE(DeathLog::Get().WaitFor(3));
-    // Nothing more arrives.
-    EXPECT_FALSE(DeathLog::Get().WaitFor(4, 200ms));
-    for (int& cookie : cookies) EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookie));
-    for (const auto& notice : DeathLog::Get().notices()) {
-        EXPECT_NE(std::this_thread::get_id(), notice.second);
-    }
-    EXPECT_FALSE(AIBinder_isAlive(binder));
-    EXPECT_FALSE(AIBinder_isAlive(echo.get()));
-    int32_t result = 0;
-    EXPECT_EQ(STATUS_DEAD_OBJECT, service->Open(1, &result).getStatus());
-    EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_ping(binder));
-    EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_linkToDeath(binder, first.get(), &cookies[0]));
-}
-
-TEST_F(CrossProcessTest, CallInFlightFailsAtOnceWhenThePeerDies) {
-    pid_t pid = -1;
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
-    ASSERT_NE(nullptr, service);
-    std::atomic<binder_status_t> status{STATUS_OK};
-    std::atomic<bool> returned{false};
-    std::thread caller([&] {
-        int32_t result = 0;
-        status = service->EnableLowPower(TestService::kBlockForever, true, &result).getStatus();
-        returned = true;
-    });
-    // The call is being served once the blocking method holds a pool thread; a ping still
-    // goes through on another one.
-    EXPECT_EQ(STATUS_OK, AIBinder_ping(service->asBinder().get()));
-    std::this_thread::sleep_for(50ms);
-    EXPECT_FALSE(returned.load());
-    Kill(pid);
-    EXPECT_TRUE(Eventually([&] { return returned.load(); }, 5s));
-    caller.join();
-    EXPECT_EQ(STATUS_DEAD_OBJECT, status.load());
-}
-
-TEST_F(CrossProcessTest, UnlinkedRecipientsAreNotNotified) {
-    pid_t pid = -1;
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
-    ASSERT_NE(nullptr, service);
-    AIBinder* binder = service->asBinder().get();
-    ndk::ScopedAIBinder_DeathRecipient exact(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    ndk::ScopedAIBinder_DeathRecipient by_null(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    AIBinder_DeathRecipient* deleted = AIBinder_DeathRecipient_new(DeathLog::OnDied);
-    ndk::ScopedAIBinder_DeathRecipient kept(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    int cookies[5];
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, exact.get(), &cookies[0]));
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, by_null.get(), &cookies[1]));
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, by_null.get(), &cookies[2]));
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, deleted, &cookies[3]));
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, kept.get(), &cookies[4]));
-
-    EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder, exact.get(), &cookies[1]));
-    EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, exact.get(), &cookies[0]));
-    EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder, exact.get(), &cookies[0]));
-    // A null cookie matches only a link made with a null cookie: it removes nothing here.
-    EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder, by_null.get(), nullptr));
-    EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, by_null.get(), &cookies[1]));
-    EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, by_null.get(), &cookies[2]));
-    AIBinder_DeathRecipient_delete(deleted);
-
-    Kill(pid);
-    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
-    EXPECT_FALSE(DeathLog::Get().WaitFor(2, 200ms));
-    EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookies[4]));
-    // Once its notice has run, the link is gone.
-    EXPECT_TRUE(Eventually([&] {
-        return AIBinder_unlinkToDeath(binder, kept.get(), &cookies[4]) == STATUS_NAME_NOT_FOUND;
-    }));
-}
-
-// A oneway call carries no sender pid on a device; a two-way one does.
-TEST_F(CrossProcessTest, TheCallingPidOfAOnewayCallIsZero) {
-    auto service = ndk::SharedRefBase::make<TestService>();
-    ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "vyr.local"));
-    vyr_test::RawPeer peer(registry_.path(), "vyr.local");
-    ASSERT_TRUE(peer.connected());
-    const uint64_t target = peer.LookUp("vyr.local");
-    ASSERT_NE(0u, target);
-    // SetTorchLightState, the interface's ninth method.
-    ASSERT_TRUE(peer.SendCall(target, 2, IVYRService::descriptor, 8, {5}));
-    ASSERT_TRUE(Eventually([&] { return service->last_torch_state() == 5; }));
-    int32_t caller = -1;
-    ASSERT_TRUE(service->Open(TestService::kQueryTorchCaller, &caller).isOk());
-    EXPECT_EQ(getpid(), caller);
-    ASSERT_TRUE(peer.SendCall(target, 3, IVYRService::descriptor, 8, {6}, FLAG_ONEWAY));
-    ASSERT_TRUE(Eventually([&] { return service->last_torch_state() == 6; }));
-    ASSERT_TRUE(service->Open(TestService::kQueryTorchCaller, &caller).isOk());
-    EXPECT_EQ(0, caller);
-}
-
-std::atomic<int> g_unlinked_first{0};
-std::atomic<int> g_unlinked_second{0};
-
-// onUnlinked is taken when a link is made: a later setOnUnlinked reaches only later links.
-TEST_F(CrossProcessTest, OnUnlinkedIsTheOneInForceWhenTheLinkWasMade) {
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
-    ASSERT_NE(nullptr, service);
-    AIBinder* binder = service->asBinder().get();
-    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    AIBinder_DeathRecipient_setOnUnlinked(recipient.get(), [](void*) { ++g_unlinked_first; });
-    int cookies[2];
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, recipient.get(), &cookies[0]));
-    AIBinder_DeathRecipient_setOnUnlinked(recipient.get(), [](void*) { ++g_unlinked_second; });
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, recipient.get(), &cookies[1]));
-    ASSERT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, recipient.get(), &cookies[0]));
-    EXPECT_EQ(1, g_unlinked_first.load());
-    EXPECT_EQ(0, g_unlinked_second.load());
-    ASSERT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, recipient.get(), &cookies[1]));
-    EXPECT_EQ(1, g_unlinked_first.load());
-    EXPECT_EQ(1, g_unlinked_second.load());
-}
-
-TEST_F(CrossProcessTest, ANullCookieUnlinksOnlyALinkMadeWithANullCookie) {
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
-    ASSERT_NE(nullptr, service);
-    AIBinder* binder = service->asBinder().get();
-    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    int cookie = 0;
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, recipient.get(), &cookie));
-    EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder, recipient.get(), nullptr));
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, recipient.get(), nullptr));
-    EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, recipient.get(), nullptr));
-    EXPECT_EQ(STATUS_OK, AIBinder_unlinkToDeath(binder, recipient.get(), &cookie));
-}
-
-// A oneway call's sender learns at once whether the receiver's transaction buffer took it. Calls
-// queued behind a blocked one fill the oneway half; the next is refused with FAILED_TRANSACTION,
-// and the connection, and two-way calls, go on.
-TEST_F(CrossProcessTest, AOnewayFloodIsRefusedAndTheConnectionServesOn) {
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
-    ASSERT_NE(nullptr, service);
-    AIBinder* binder = service->asBinder().get();
-    const auto oneway = [binder](transaction_code_t code, const std::vector<int32_t>& args) {
-        AParcel* in = nullptr;
-        binder_status_t status = AIBinder_prepareTransaction(binder, &in);
-        if (status != STATUS_OK) return status;
-        for (int32_t arg : args) AParcel_writeInt32(in, arg);
-        AParcel* out = nullptr;
-        status = AIBinder_transact(binder, code, &in, &out, FLAG_ONEWAY);
-        AParcel_delete(out);
-        return status;
-    };
-    // EnableLowPower(kBlockForever, true): every later oneway call to the object waits behind it.
-    ASSERT_EQ(STATUS_OK, oneway(FIRST_CALL_TRANSACTION + 5, {TestService::kBlockForever, 1}));
-    binder_status_t status = STATUS_OK;
-    int accepted = 0;
-    while (accepted < 200000) {
-        status = oneway(FIRST_CALL_TRANSACTION, {1});
-        if (status != STATUS_OK) break;
-        ++accepted;
-    }
-    EXPECT_EQ(STATUS_FAILED_TRANSACTION, status) << accepted << " calls accepted";
-    EXPECT_GT(accepted, 1000);
-    EXPECT_TRUE(AIBinder_isAlive(binder));
-    int32_t result = 0;
-    EXPECT_TRUE(service->SetTorchLightState(3).isOk());
-    EXPECT_TRUE(service->Open(TestService::kQueryTorch, &result).isOk());
-    EXPECT_EQ(3, result);
-    EXPECT_EQ(STATUS_FAILED_TRANSACTION, oneway(FIRST_CALL_TRANSACTION, {1}));
-}
-
-TEST_F(CrossProcessTest, ClientDeathIsSeenByTheService) {
-    auto service = ndk::SharedRefBase::make<TestService>();
-    ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "vyr.local"));
-    pid_t pid = Spawn("client", "vyr.local");
-    ASSERT_TRUE(Eventually([&] { return service->callback() != nullptr; }));
-    std::shared_ptr<IEventCallback> callback = service->callback();
-    EXPECT_TRUE(callback->isRemote());
-    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    int cookie = 0;
-    AIBinder* binder = callback->asBinder().get();
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(binder, recipient.get(), &cookie));
-    ASSERT_TRUE(service->Close(2).isOk());
-    Kill(pid);
-    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
-    EXPECT_EQ(1u, DeathLog::Get().CountOf(&cookie));
-    EXPECT_EQ(STATUS_DEAD_OBJECT, callback->OnEvent(Event()).getStatus());
-}
-
-TEST_F(CrossProcessTest, ProcessWithoutPoolGetsOnlyNestedCalls) {
-    auto service = ndk::SharedRefBase::make<TestService>();
-    ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "vyr.local"));
-    pid_t pid = Spawn("nopool", "vyr.local");
-    ASSERT_GT(pid, 0);
-    int status = -1;
-    ASSERT_EQ(pid, waitpid(pid, &status, 0));
-    children_.clear();
-    ASSERT_TRUE(WIFEXITED(status));
-    EXPECT_EQ(0, WEXITSTATUS(status));
 }
 
 TEST_F(CrossProcessTest, OnewayCallsArrive) {
@@ -584,18 +263,6 @@ TEST_F(CrossProcessTest, ABurstLargerThanOneReadIsServedWhole) {
         int32_t state = 0;
         return service->Open(TestService::kQueryTorch, &state).isOk() && state == kCalls;
     }));
-}
-
-TEST_F(CrossProcessTest, TransactionsOverOneMebibyteAreRefused) {
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
-    ASSERT_NE(nullptr, service);
-    int32_t result = 0;
-    std::vector<int32_t> big(300 * 1024, 1);
-    ndk::ScopedAStatus status = service->ConfigureParameters(1, big, &result);
-    EXPECT_EQ(STATUS_FAILED_TRANSACTION, status.getStatus());
-    std::vector<int32_t> fits(200 * 1024, 1);
-    ASSERT_TRUE(service->ConfigureParameters(1, fits, &result).isOk());
-    EXPECT_EQ(200 * 1024, result);
 }
 
 TEST_F(CrossProcessTest, SixteenThreadsCallAtOnce) {
@@ -772,120 +439,6 @@ TEST_F(CrossProcessTest, WaitForServiceWakesWhenTheServiceRegistersAgain) {
     EXPECT_NE(first->asBinder().get(), second.get());
     EXPECT_TRUE(AIBinder_isAlive(second.get()));
     EXPECT_EQ(STATUS_OK, AIBinder_ping(second.get()));
-}
-
-// The binders that registration notices reported.
-class Registrations {
-  public:
-    static void OnRegister(const char* instance, AIBinder* registered, void* cookie) {
-        auto* self = static_cast<Registrations*>(cookie);
-        std::lock_guard<std::mutex> lock(self->mutex_);
-        self->names_.push_back(instance);
-        // The notice hands over a reference.
-        self->binders_.emplace_back(registered);
-        self->cv_.notify_all();
-    }
-    bool WaitFor(size_t count) {
-        std::unique_lock<std::mutex> lock(mutex_);
-        return cv_.wait_for(lock, 10s, [&] { return binders_.size() >= count; });
-    }
-    size_t Count() {
-        std::lock_guard<std::mutex> lock(mutex_);
-        return binders_.size();
-    }
-    ndk::SpAIBinder At(size_t index) {
-        std::lock_guard<std::mutex> lock(mutex_);
-        return binders_.at(index);
-    }
-    std::string NameAt(size_t index) {
-        std::lock_guard<std::mutex> lock(mutex_);
-        return names_.at(index);
-    }
-
-  private:
-    std::mutex mutex_;
-    std::condition_variable cv_;
-    std::vector<std::string> names_;
-    std::vector<ndk::SpAIBinder> binders_;
-};
-
-TEST_F(CrossProcessTest, RegistrationNoticesComeForEachNewRegistrationUntilDeleted) {
-    pid_t pid = -1;
-    ASSERT_NE(nullptr, StartServer("vyr.test", &pid));
-    Registrations seen;
-    AServiceManager_NotificationRegistration* registration =
-        AServiceManager_registerForServiceNotifications("vyr.test", &Registrations::OnRegister,
-                                                        &seen);
-    ASSERT_NE(nullptr, registration);
-    ASSERT_TRUE(seen.WaitFor(1)) << "the registration in place is reported";
-    EXPECT_EQ("vyr.test", seen.NameAt(0));
-    Kill(pid);
-    Spawn("serve", "vyr.test");
-    ASSERT_TRUE(seen.WaitFor(2)) << "a new registration is reported";
-    EXPECT_NE(seen.At(0).get(), seen.At(1).get());
-    EXPECT_EQ(STATUS_OK, AIBinder_ping(seen.At(1).get()));
-    AServiceManager_NotificationRegistration_delete(registration);
-    const size_t reported = seen.Count();
-    Kill(children_.back());
-    Spawn("serve", "vyr.test");
-    ASSERT_NE(nullptr, WaitForService("vyr.test").get());
-    EXPECT_EQ(reported, seen.Count()) << "a deleted registration reported a registration";
-    EXPECT_EQ(nullptr, AServiceManager_registerForServiceNotifications(
-                           "bad name", &Registrations::OnRegister, &seen));
-}
-
-TEST_F(CrossProcessTest, EveryProcessHoldingAServiceIsToldOfItsDeath) {
-    pid_t server = -1;
-    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &server);
-    ASSERT_NE(nullptr, service);
-    const pid_t watcher = Spawn("watch", "vyr.test");
-    const std::string marker = registry_.path() + "/vyr.test.linked." + std::to_string(watcher);
-    ASSERT_TRUE(Eventually([&] { return access(marker.c_str(), F_OK) == 0; }))
-        << "the other client never linked";
-    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
-    int cookie = 0;
-    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(service->asBinder().get(), recipient.get(), &cookie));
-    Kill(server);
-    EXPECT_TRUE(DeathLog::Get().WaitFor(1));
-    int status = -1;
-    ASSERT_TRUE(Eventually([&] { return waitpid(watcher, &status, WNOHANG) == watcher; }))
-        << "the other client was not told";
-    children_.erase(std::find(children_.begin(), children_.end(), watcher));
-    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << status;
-}
-
-// As servicemanager does, a registration replaces the one before it, of a live process too.
-// Death notices are work for the binder thread pool: a process without one hears of no death
-// until it starts one, as on a device.
-TEST_F(CrossProcessTest, AProcessWithoutAPoolGetsTheDeathNoticeOnceItStartsOne) {
-    pid_t server = -1;
-    ASSERT_NE(nullptr, StartServer("vyr.test", &server));
-    const pid_t watcher = Spawn("latepool", "vyr.test");
-    const std::string marker = registry_.path() + "/vyr.test.linked." + std::to_string(watcher);
-    ASSERT_TRUE(Eventually([&] { return access(marker.c_str(), F_OK) == 0; }))
-        << "the other client never linked";
-    Kill(server);
-    int status = -1;
-    ASSERT_TRUE(Eventually([&] { return waitpid(watcher, &status, WNOHANG) == watcher; }, 20s));
-    children_.erase(std::find(children_.begin(), children_.end(), watcher));
-    ASSERT_TRUE(WIFEXITED(status)) << status;
-    EXPECT_EQ(0, WEXITSTATUS(status)) << "5: a notice came without a pool; 6: none came with one";
-}
-
-TEST_F(CrossProcessTest, ARegistrationReplacesTheOneBefore) {
-    pid_t pid = -1;
-    std::shared_ptr<IVYRService> first = StartServer("vyr.test", &pid);
-    ASSERT_NE(nullptr, first);
-    auto mine = ndk::SharedRefBase::make<TestService>();
-    EXPECT_EQ(EX_NONE, AServiceManager_addService(mine->asBinder().get(), "vyr.test"));
-    ndk::SpAIBinder found(AServiceManager_checkService("vyr.test"));
-    EXPECT_EQ(mine.get(), IVYRService::fromBinder(found).get());
-    // The first one still serves whoever holds it.
-    int32_t result = 0;
-    EXPECT_TRUE(first->Open(2, &result).isOk());
-    Kill(pid);
-    found = ndk::SpAIBinder(AServiceManager_checkService("vyr.test"));
-    EXPECT_EQ(mine.get(), IVYRService::fromBinder(found).get());
 }
 
 TEST_F(CrossProcessTest, WrongInterfaceTokenIsRefusedRemotely) {

@@ -5,8 +5,6 @@
 #include <unistd.h>
 #include <vyr/binder_host.h>
 
-#include <vector>
-
 #include "binder_test_env.h"
 #include "test_service.h"
 
@@ -129,33 +127,6 @@ TEST(InProcessTest, DeathLinksOnLocalBinderAreRefused) {
               AIBinder_linkToDeath(binder.get(), recipient.get(), &cookie));
     EXPECT_EQ(STATUS_NAME_NOT_FOUND, AIBinder_unlinkToDeath(binder.get(), recipient.get(), &cookie));
     EXPECT_EQ(STATUS_UNEXPECTED_NULL, AIBinder_linkToDeath(nullptr, recipient.get(), &cookie));
-}
-
-// Cookies that onUnlinked reported, in order.
-std::vector<void*>& UnlinkedCookies() {
-    static std::vector<void*> cookies;
-    return cookies;
-}
-void RecordUnlinked(void* cookie) {
-    UnlinkedCookies().push_back(cookie);
-}
-void IgnoreDeath(void* /*cookie*/) {}
-
-// The platform reports a link that could not be made as unlinked inside the failing call, with
-// the onUnlinked in force when the link was tried.
-TEST(InProcessTest, AFailedLinkIsReportedUnlinkedBeforeItReturns) {
-    auto service = ndk::SharedRefBase::make<TestService>();
-    ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(&IgnoreDeath));
-    AIBinder_DeathRecipient_setOnUnlinked(recipient.get(), &RecordUnlinked);
-    UnlinkedCookies().clear();
-    int cookie = 0;
-    EXPECT_EQ(STATUS_INVALID_OPERATION,
-              AIBinder_linkToDeath(service->asBinder().get(), recipient.get(), &cookie));
-    EXPECT_EQ(UnlinkedCookies(), std::vector<void*>{&cookie});
-    AIBinder_DeathRecipient_setOnUnlinked(recipient.get(), nullptr);
-    EXPECT_EQ(STATUS_INVALID_OPERATION,
-              AIBinder_linkToDeath(service->asBinder().get(), recipient.get(), &cookie));
-    EXPECT_EQ(UnlinkedCookies().size(), 1u);
 }
 
 TEST(InProcessTest, ServiceLookedUpInItsOwnProcessIsTheLocalObject) {
