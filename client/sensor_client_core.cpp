@@ -199,9 +199,10 @@ void SensorClient::Core::Supervise() {
 
 bool SensorClient::Core::Reattach(int32_t old_handle, const ndk::SpAIBinder& dead) {
     AServiceManager_NotificationRegistration* registration =
-        AServiceManager_registerForServiceNotifications(kServiceName, &Core::OnRegistered, this);
+        AServiceManager_registerForServiceNotifications(policy_.service_name.c_str(),
+                                                        &Core::OnRegistered, this);
     if (registration == nullptr) {
-        GiveUp(std::string("cannot wait for \"") + kServiceName + "\" to be registered");
+        GiveUp("cannot wait for \"" + policy_.service_name + "\" to be registered");
         return false;
     }
     int refusals = 0;
@@ -222,8 +223,7 @@ bool SensorClient::Core::Reattach(int32_t old_handle, const ndk::SpAIBinder& dea
         if (!AIBinder_isAlive(binder.get())) continue;
         std::shared_ptr<IVYRService> service = IVYRService::fromBinder(binder);
         if (service == nullptr) {
-            GiveUp(std::string("\"") + kServiceName + "\" does not implement " +
-                   IVYRService::descriptor);
+            GiveUp("\"" + policy_.service_name + "\" does not implement " + IVYRService::descriptor);
             break;
         }
         const Attempt attempt = Attach(service);

@@ -7,11 +7,11 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <climits>
-
 #if !defined(__ANDROID__)
 #include <vyr/binder_host.h>
 #endif
+
+#include "test_files.h"
 
 extern char** environ;
 
@@ -23,10 +23,7 @@ std::string HelperPath() {
 #if defined(BINDER_TEST_HELPER)
     return BINDER_TEST_HELPER;
 #else
-    char self[PATH_MAX] = {};
-    ssize_t length = readlink("/proc/self/exe", self, sizeof(self) - 1);
-    std::string dir(self, length > 0 ? static_cast<size_t>(length) : 0);
-    return dir.substr(0, dir.rfind('/') + 1) + "vyr_binder_test_helper";
+    return vyr_test::ProgramBesideThisOne("vyr_binder_test_helper");
 #endif
 }
 

@@ -74,11 +74,11 @@ void ExitOnDeath(void* /*cookie*/) {
 // Links `on_died` to the death of the service `name`, then tells the test so; 0 or the exit
 // status of the step that failed.
 int LinkAndTell(const std::string& name, AIBinder_DeathRecipient_onBinderDied on_died,
-                ndk::SpAIBinder* binder) {
+                ndk::SpAIBinder* binder, ndk::ScopedAIBinder_DeathRecipient* recipient) {
     *binder = ndk::SpAIBinder(AServiceManager_getService(name.c_str()));
     if (binder->get() == nullptr) return 2;
-    AIBinder_DeathRecipient* recipient = AIBinder_DeathRecipient_new(on_died);
-    if (AIBinder_linkToDeath(binder->get(), recipient, nullptr) != STATUS_OK) return 3;
+    recipient->set(AIBinder_DeathRecipient_new(on_died));
+    if (AIBinder_linkToDeath(binder->get(), recipient->get(), nullptr) != STATUS_OK) return 3;
     const char* dir = getenv("VYR_BINDER_DIR");
     const std::string marker = std::string(dir != nullptr ? dir : "/tmp") + "/" + name +
                                ".linked." + std::to_string(getpid());
@@ -91,7 +91,8 @@ int LinkAndTell(const std::string& name, AIBinder_DeathRecipient_onBinderDied on
 int Watch(const std::string& name) {
     ABinderProcess_startThreadPool();
     ndk::SpAIBinder binder;
-    if (int failed = LinkAndTell(name, &ExitOnDeath, &binder)) return failed;
+    ndk::ScopedAIBinder_DeathRecipient recipient;
+    if (int failed = LinkAndTell(name, &ExitOnDeath, &binder, &recipient)) return failed;
     for (;;) pause();
 }
 
@@ -103,7 +104,8 @@ void CountDeath(void* /*cookie*/) {
 
 int LatePool(const std::string& name) {
     ndk::SpAIBinder binder;
-    if (int failed = LinkAndTell(name, &CountDeath, &binder)) return failed;
+    ndk::ScopedAIBinder_DeathRecipient recipient;
+    if (int failed = LinkAndTell(name, &CountDeath, &binder, &recipient)) return failed;
     // The proxy is dead as soon as the runtime reads the hang-up, pool or not.
     while (AIBinder_isAlive(binder.get())) usleep(1000);
     // A notice would need a pool thread, and there is none.

@@ -1,6 +1,8 @@
 #include "test_files.h"
 
+#include <limits.h>
 #include <stdlib.h>
+#include <unistd.h>
 
 #include <fstream>
 #include <sstream>
@@ -9,7 +11,14 @@
 namespace vyr_test {
 
 std::string MakeTempDir(const std::string& prefix) {
-    std::string pattern = "/tmp/" + prefix + "XXXXXX";
+#if defined(__ANDROID__)
+    const char* tmpdir = getenv("TMPDIR");
+    const std::string base = tmpdir != nullptr ? tmpdir : "/data/local/tmp";
+#else
+    // Short, so that the sockets of a binder registry made in it fit a socket address.
+    const std::string base = "/tmp";
+#endif
+    std::string pattern = base + "/" + prefix + "XXXXXX";
     std::vector<char> path(pattern.begin(), pattern.end());
     path.push_back('\0');
     return mkdtemp(path.data()) == nullptr ? std::string() : std::string(path.data());
@@ -20,6 +29,13 @@ std::string ReadFile(const std::string& path) {
     std::stringstream text;
     text << in.rdbuf();
     return text.str();
+}
+
+std::string ProgramBesideThisOne(const std::string& name) {
+    char self[PATH_MAX] = {};
+    const ssize_t length = readlink("/proc/self/exe", self, sizeof(self) - 1);
+    const std::string path(self, length > 0 ? static_cast<size_t>(length) : 0);
+    return path.substr(0, path.rfind('/') + 1) + name;
 }
 
 }  // namespace vyr_test

@@ -61,6 +61,8 @@ struct ReattachPolicy {
     std::chrono::milliseconds max_delay{4000};
     // Refusals in a row after which the client gives up.
     int max_refusals = 30;
+    // The name whose next registration is waited for: the service's own, or a test instance's.
+    std::string service_name = "vyrservice";
 };
 
 class SensorClientListener {
