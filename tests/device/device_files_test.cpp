@@ -169,8 +169,42 @@ TEST_F(DeviceFilesTest, AFileContextsPathThatNothingUsesFails) {
 }
 
 TEST_F(DeviceFilesTest, AServiceNameThatTheCodeDoesNotRegisterFails) {
-    Edit("sepolicy/vndservice_contexts", "vyrservice ", "vyr.service ");
+    Edit("sepolicy/service_contexts", "vyrservice ", "vyr.service ");
     EXPECT_FAILS_WITH(CheckCopy(), "service vyr.service is not registered by the code");
+}
+
+TEST_F(DeviceFilesTest, ARegisteredNameWithoutServiceContextsEntryFails) {
+    WriteFile(tree_ / "sepolicy/service_contexts", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "registered service vyrservice has no context");
+}
+
+TEST_F(DeviceFilesTest, ALabelThatIsNoServiceManagerTypeFails) {
+    Edit("sepolicy/vyrservice.te", "type vyrservice_service, service_manager_type;",
+         "type vyrservice_service, file_type;");
+    EXPECT_FAILS_WITH(CheckCopy(), "does not declare a service_manager_type");
+}
+
+TEST_F(DeviceFilesTest, AVndserviceContextsBesideNdkRegistrationFails) {
+    WriteFile(tree_ / "sepolicy/vndservice_contexts",
+              "vyrservice    u:object_r:vyrservice_service:s0\n");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "sepolicy/vndservice_contexts: the code registers through libbinder_ndk");
+}
+
+TEST_F(DeviceFilesTest, VndbinderUseBesideNdkRegistrationFails) {
+    Append("sepolicy/vyrservice.te", "vndbinder_use(vyrservice)\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "vndbinder_use(vyrservice): the code registers through");
+}
+
+TEST_F(DeviceFilesTest, AClientAttributeWithoutBinderUseFails) {
+    Edit("sepolicy/vyrservice.te", "binder_use(vyrservice_client)\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "client vyrservice_client finds vyrservice_service but has no binder_use");
+}
+
+TEST_F(DeviceFilesTest, AServiceDomainWithoutBinderUseFails) {
+    Edit("sepolicy/vyrservice.te", "binder_use(vyrservice)\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice adds vyrservice_service but has no binder_use");
 }
 
 TEST_F(DeviceFilesTest, ARenamedRegistrationFails) {

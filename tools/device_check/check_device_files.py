@@ -6,7 +6,10 @@
 - every SELinux type, attribute or property type that the policy uses is declared by the policy
   or is one of the platform's (PLATFORM_TYPES);
 - every path in file_contexts and genfs_contexts is the installed binary or a path the code opens;
-- vndservice_contexts names the service that the code registers;
+- the policy is written for the binder that the code registers on: libbinder_ndk always reaches
+  servicemanager on /dev/binder, so service_contexts labels every name that the code registers
+  (and nothing else) with a service_manager_type, the registering domain and every client
+  attribute have binder_use, and no vndservice_contexts or vndbinder_use is left;
 - the init service runs the path where Android.bp installs the vendor binary that carries the .rc;
 - every .cpp of the service, the listener and the client library is in Android.bp, and (with
   --cmake-sources, written
@@ -33,12 +36,15 @@ PLATFORM_TYPES = {
     "exec_type",
     "file_type",
     "fs_type",
+    "service_manager_type",
+    "shell",
     "sysfs_type",
     "vendor_file_type",
-    "vndservice_manager_type",
 }
 # Policy macros that declare their first argument.
 DECLARING_MACROS = {"vendor_internal_prop", "vendor_restricted_prop", "vendor_public_prop"}
+# Policy macros whose argument is policy kept for some builds only (m4 quoted).
+BUILD_VARIANT_MACROS = ("userdebug_or_eng", "eng", "user_only")
 # Folders that only the host build uses.
 HOST_ONLY = ["host", "sensors/simulator", "sensors/doubles", "tools/sandbox"]
 # Folders whose every .cpp belongs to a library or binary of both builds (the service, the
@@ -238,6 +244,19 @@ def without_comments(text):
     return re.sub(r"#[^\n]*", "", text)
 
 
+def policy_text(checker, te):
+    """A .te file without comments, with the rules of build-variant macros unwrapped."""
+    text = without_comments(checker.read(te))
+    return re.sub(r"\b(?:" + "|".join(BUILD_VARIANT_MACROS) + r")\s*\(\s*`(.*?)'\s*\)", r"\1",
+                  text, flags=re.S)
+
+
+def macro_calls(text, macro):
+    """The argument lists of every call of one policy macro."""
+    return [[a.strip() for a in arguments.split(",")]
+            for arguments in re.findall(r"\b" + macro + r"\s*\(([^)]*)\)", text)]
+
+
 def context_type(context):
     parts = context.split(":")
     return parts[2] if len(parts) >= 4 else None
@@ -246,7 +265,7 @@ def context_type(context):
 def check_policy_types(checker):
     declared, used = set(), []
     for te in policy_files(checker, suffix=".te"):
-        text = without_comments(checker.read(te))
+        text = policy_text(checker, te)
         for kind, body in re.findall(r"\b(type|attribute|typeattribute)\s+([^;]+);", text):
             names = [n.strip() for n in body.split(",")]
             if kind == "typeattribute":
@@ -294,20 +313,69 @@ def check_policy_paths(checker, binary_paths):
                 checker.defect(contexts, f"{path} is not a path that the code opens")
 
 
-def check_service_name(checker):
+def context_entries(checker, name):
+    """(name, type) of every line of one of the policy's contexts files."""
+    entries = []
+    for contexts in policy_files(checker, name=name):
+        for line in without_comments(checker.read(contexts)).splitlines():
+            fields = line.split()
+            if len(fields) >= 2:
+                entries.append((fields[0], context_type(fields[1])))
+    return entries
+
+
+def check_binder_path(checker):
     registered = registered_service_names(checker)
     if not registered:
         checker.defect("vyrservice", "no AServiceManager_addService call with a name found")
-    listed = set()
-    for contexts in policy_files(checker, name="vndservice_contexts"):
-        for line in without_comments(checker.read(contexts)).splitlines():
-            if line.split():
-                listed.add(line.split()[0])
-    for name in sorted(listed - registered):
-        checker.defect("sepolicy/vndservice_contexts", f"service {name} is not registered by the "
-                                                       f"code (it registers {sorted(registered)})")
+        return
+    # libbinder_ndk has no way to reach vndservicemanager: a vendor process that registers through
+    # it talks /dev/binder, whose rules are binder_use and service_contexts.
+    if policy_files(checker, name="vndservice_contexts"):
+        checker.defect("sepolicy/vndservice_contexts", "the code registers through libbinder_ndk, "
+                       "which reaches servicemanager, not vndservicemanager: label the name in "
+                       "service_contexts")
+    texts = {te: policy_text(checker, te) for te in policy_files(checker, suffix=".te")}
+    for te, text in texts.items():
+        for arguments in macro_calls(text, "vndbinder_use"):
+            checker.defect(te, f"vndbinder_use({', '.join(arguments)}): the code registers through "
+                               "libbinder_ndk, which uses /dev/binder (binder_use)")
+    service_types = set()
+    binder_users = set()
+    for text in texts.values():
+        for name, kinds in re.findall(r"\btype\s+(\w+)\s*,([^;]*);", text):
+            if "service_manager_type" in [k.strip() for k in kinds.split(",")]:
+                service_types.add(name)
+        binder_users.update(arguments[0] for arguments in macro_calls(text, "binder_use"))
+    entries = context_entries(checker, "service_contexts")
+    listed = {name for name, _ in entries}
+    for name, label in entries:
+        if name not in registered:
+            checker.defect("sepolicy/service_contexts", f"service {name} is not registered by the "
+                                                        f"code (it registers {sorted(registered)})")
+        if label not in service_types:
+            checker.defect("sepolicy/service_contexts", f"{name} is labelled {label}, which the "
+                                                        "policy does not declare a "
+                                                        "service_manager_type")
     for name in sorted(registered - listed):
-        checker.defect("sepolicy/vndservice_contexts", f"registered service {name} has no context")
+        checker.defect("sepolicy/service_contexts", f"registered service {name} has no context: "
+                                                    "servicemanager would label it "
+                                                    "default_android_service, which no vendor "
+                                                    "domain may add")
+    labels = {label for _, label in entries}
+    for te, text in texts.items():
+        for arguments in macro_calls(text, "add_service"):
+            if len(arguments) == 2 and arguments[1] in labels and arguments[0] not in binder_users:
+                checker.defect(te, f"{arguments[0]} adds {arguments[1]} but has no binder_use")
+        # Whoever looks a service of this policy up is its client, and needs binder_use to reach
+        # servicemanager at all.
+        for subjects, target in re.findall(
+                r"\ballow\s+([^;:]+?)\s+(\w+)\s*:\s*service_manager\s+[^;]*\bfind\b", text):
+            if target not in labels:
+                continue
+            for subject in re.findall(r"[A-Za-z_]\w*", subjects):
+                if subject not in binder_users and subject not in PLATFORM_TYPES:
+                    checker.defect(te, f"client {subject} finds {target} but has no binder_use")
 
 
 # --- init ----------------------------------------------------------------------------------------
@@ -460,7 +528,7 @@ def main():
     binary_paths = check_init_scripts(checker, modules)
     check_policy_types(checker)
     check_policy_paths(checker, binary_paths)
-    check_service_name(checker)
+    check_binder_path(checker)
     check_sources(checker, modules, args.cmake_sources)
     check_host_only(checker, modules)
     check_test_mapping(checker, modules)
