@@ -113,6 +113,24 @@ TEST_F(DeviceFilesTest, TheCopyPassesUnchanged) {
     EXPECT_EQ(result.exit_status, 0) << result.output;
 }
 
+// A checkout under a linked home is reached through a symbolic link: every step walks the tree
+// behind it.
+TEST_F(DeviceFilesTest, TheCopyPassesThroughASymbolicLink) {
+    const fs::path link = temp_.Path("link");
+    fs::create_directory_symlink(tree_, link);
+    const CheckResult result = Check(link);
+    EXPECT_EQ(result.exit_status, 0) << result.output;
+    EXPECT_NE(result.output.find("Android.bp files load in Soong's test context"), std::string::npos)
+        << result.output;
+}
+
+TEST_F(DeviceFilesTest, ADefectBehindASymbolicLinkIsFound) {
+    Edit("vyrservice/Android.bp", "    vendor: true,\n", "    vendor:true,\n");
+    const fs::path link = temp_.Path("link");
+    fs::create_directory_symlink(tree_, link);
+    EXPECT_FAILS_WITH(Check(link), "vyrservice/Android.bp is not formatted");
+}
+
 TEST_F(DeviceFilesTest, AnAndroidBpThatBpfmtWouldReformatFails) {
     Edit("vyrservice/Android.bp", "    vendor: true,\n", "    vendor:true,\n");
     EXPECT_FAILS_WITH(CheckCopy(), "vyrservice/Android.bp is not formatted");

@@ -151,10 +151,15 @@ func main() {
 		fmt.Fprintln(os.Stderr, "usage: soong_check ROOT")
 		os.Exit(2)
 	}
-	root := os.Args[1]
+	// Walk does not follow a root that is a symbolic link: walk the folder it points to.
+	root, err := filepath.EvalSymlinks(os.Args[1])
+	if err != nil {
+		fmt.Fprintln(os.Stderr, "soong_check:", err)
+		os.Exit(2)
+	}
 	files := map[string][]byte{}
 	var blueprints []string
-	err := filepath.Walk(root, func(path string, info os.FileInfo, err error) error {
+	err = filepath.Walk(root, func(path string, info os.FileInfo, err error) error {
 		if err != nil {
 			return err
 		}
