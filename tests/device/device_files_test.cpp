@@ -283,6 +283,41 @@ TEST_F(DeviceFilesTest, AModuleThatReachesIntoTheHostRuntimeFails) {
     EXPECT_FAILS_WITH(CheckCopy(), "libvyrservice reaches the host-only host/properties");
 }
 
+TEST_F(DeviceFilesTest, AVyrctlSourceMissingFromAndroidBpFails) {
+    WriteFile(tree_ / "tools/vyrctl/record_command.cpp", "\n");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "tools/vyrctl/record_command.cpp: is in no module of Android.bp");
+}
+
+TEST_F(DeviceFilesTest, AModuleWithoutThreadSafetyAnalysisFails) {
+    Edit("Android.bp", "        \"-Wthread-safety\",\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "libvyrservice is built without -Wthread-safety");
+}
+
+TEST_F(DeviceFilesTest, AModuleWithoutMinSdkVersionFails) {
+    Edit("Android.bp", "    min_sdk_version: \"34\",\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice has min_sdk_version None");
+}
+
+TEST_F(DeviceFilesTest, AMinSdkVersionBelowTheNdkCallsFails) {
+    Edit("Android.bp", "    min_sdk_version: \"34\",", "    min_sdk_version: \"31\",");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice has min_sdk_version '31'");
+}
+
+TEST_F(DeviceFilesTest, AVendorAvailableClientLibraryFails) {
+    Edit("client/Android.bp", "    vendor: true,", "    vendor_available: true,");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "libvyrclient is vendor_available, but the interface is not VINTF-stable");
+}
+
+TEST_F(DeviceFilesTest, AFuzzerOnTheSensorLibrariesFails) {
+    Edit("tests/service/Android.bp", "        \"libvyr_sensor_doubles\",\n", "");
+    Edit("tests/service/Android.bp", "    srcs: [\"fuzz/vyrservice_fuzzer.cpp\"],\n",
+         "    srcs: [\"fuzz/vyrservice_fuzzer.cpp\"],\n    shared_libs: "
+         "[\"libubk_range_sensor\"],\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice_fuzzer links libubk_range_sensor");
+}
+
 TEST_F(DeviceFilesTest, ACcTestMissingFromTestMappingFails) {
     Edit("TEST_MAPPING", "    {\n      \"name\": \"vyrservice_event_parcel_tests\"\n    }\n", "");
     Edit("TEST_MAPPING", "},\n  ]", "}\n  ]");
@@ -303,13 +338,16 @@ TEST_F(DeviceFilesTest, ACcTestWithoutTestSuitesFails) {
 }
 
 TEST_F(DeviceFilesTest, AnUnknownPropertyFailsInSoong) {
-    Edit("client/Android.bp", "    vendor_available: true,", "    vendor_availble: true,");
+    Edit("apex_update_listener/Android.bp", "    vendor_available: true,",
+         "    vendor_availble: true,");
     EXPECT_FAILS_WITH(CheckCopy(),
-                      "client/Android.bp:5:20: unrecognized property \"vendor_availble\"");
+                      "apex_update_listener/Android.bp:5:20: unrecognized property "
+                      "\"vendor_availble\"");
 }
 
 TEST_F(DeviceFilesTest, APropertyOfTheWrongTypeFailsInSoong) {
-    Edit("client/Android.bp", "    vendor_available: true,", "    vendor_available: \"yes\",");
+    Edit("apex_update_listener/Android.bp", "    vendor_available: true,",
+         "    vendor_available: \"yes\",");
     EXPECT_FAILS_WITH(CheckCopy(),
                       "can't assign string value to bool property \"vendor_available\"");
 }

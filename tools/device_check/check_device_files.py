@@ -11,9 +11,11 @@
   (and nothing else) with a service_manager_type, the registering domain and every client
   attribute have binder_use, and no vndservice_contexts or vndbinder_use is left;
 - the init service runs the path where Android.bp installs the vendor binary that carries the .rc;
-- every .cpp of the service, the listener and the client library is in Android.bp, and (with
-  --cmake-sources, written
-  by the host build) the host build compiles the same sources for each library;
+- every .cpp of the service, the listener, the client library, vyrctl and the sensor doubles is
+  in Android.bp, and (with --cmake-sources, written by the host build) the host build compiles the
+  same sources for each library;
+- every C++ module is built with -Wthread-safety and min_sdk_version 34 or later, none is
+  vendor_available while the interface is not VINTF-stable, and no fuzzer links a sensor library;
 - no Android.bp exists in, or points into, a host-only folder;
 - every cc_test names its test suites and is in the root TEST_MAPPING, which names no module that
   does not exist.
@@ -46,10 +48,20 @@ DECLARING_MACROS = {"vendor_internal_prop", "vendor_restricted_prop", "vendor_pu
 # Policy macros whose argument is policy kept for some builds only (m4 quoted).
 BUILD_VARIANT_MACROS = ("userdebug_or_eng", "eng", "user_only")
 # Folders that only the host build uses.
-HOST_ONLY = ["host", "sensors/simulator", "sensors/doubles", "tools/sandbox"]
+HOST_ONLY = ["host", "sensors/simulator", "tools/sandbox"]
 # Folders whose every .cpp belongs to a library or binary of both builds (the service, the
 # listener, the client library).
 SERVICE_FOLDERS = ["vyrservice", "apex_update_listener", "client"]
+# Further folders whose every .cpp is in a module of the device build: vyrctl, and the sensor
+# doubles that the device fuzzer runs on.
+DEVICE_FOLDERS = SERVICE_FOLDERS + ["tools/vyrctl", "sensors/doubles"]
+# Module types that compile C++ of this tree.
+CC_MODULE_TYPES = {"cc_library", "cc_library_static", "cc_library_shared", "cc_binary", "cc_test",
+                   "cc_fuzz"}
+# The closed sensor libraries: what only the service binary may link.
+SENSOR_LIBRARIES = {"libambient_light_sensor", "libubk_range_sensor"}
+# The lowest platform version whose NDK has every call that the code makes.
+MIN_SDK_VERSION = 34
 # A vendor cc_binary is installed here.
 VENDOR_BIN = "/vendor/bin/"
 
@@ -169,16 +181,26 @@ def load_modules(checker):
             modules.append(module)
     defaults = {m["props"].get("name"): m["props"] for m in modules if m["type"] == "cc_defaults"}
     for module in modules:
-        for name in module["props"].get("defaults", []):
-            for key, value in defaults.get(name, {}).items():
-                own = module["props"].get(key)
-                if key == "name":
-                    continue
-                if own is None:
-                    module["props"][key] = value
-                elif isinstance(own, list) and isinstance(value, list):
-                    module["props"][key] = value + own
+        apply_defaults(module["props"], defaults, set())
     return modules
+
+
+def apply_defaults(props, defaults, seen):
+    """Merges the properties of the defaults that props names, and of those that they name."""
+    for name in props.get("defaults", []):
+        if name in seen or name not in defaults:
+            continue
+        seen.add(name)
+        inherited = dict(defaults[name])
+        apply_defaults(inherited, defaults, seen)
+        for key, value in inherited.items():
+            own = props.get(key)
+            if key in ("name", "defaults"):
+                continue
+            if own is None:
+                props[key] = value
+            elif isinstance(own, list) and isinstance(value, list):
+                props[key] = value + [v for v in own if v not in value]
 
 
 def strings_in(value):
@@ -440,7 +462,7 @@ def check_sources(checker, modules, cmake_sources):
         for source in module["props"].get("srcs", []):
             listed.setdefault(os.path.normpath(os.path.join(module["dir"], source)), []).append(
                 module["props"].get("name"))
-    for folder in SERVICE_FOLDERS:
+    for folder in DEVICE_FOLDERS:
         path = os.path.join(checker.root, folder)
         for directory, _, files in os.walk(path):
             for name in sorted(files):
@@ -481,6 +503,37 @@ def check_host_only(checker, modules):
             if any(target == f or target.startswith(f + "/") for f in HOST_ONLY):
                 checker.defect(module["file"], f"{module['props'].get('name')} reaches the "
                                                f"host-only {target}")
+
+
+def check_conventions(checker, modules):
+    """What a device tree expects of the modules: checked locks, the platform version, the
+    partition that the interface's stability allows, and no hardware under a fuzzer."""
+    stable = any(m["type"] == "aidl_interface" and m["props"].get("stability") == "vintf"
+                 for m in modules)
+    for module in modules:
+        props = module["props"]
+        name = props.get("name")
+        if module["type"] not in CC_MODULE_TYPES:
+            continue
+        if "-Wthread-safety" not in props.get("cflags", []):
+            checker.defect(module["file"], f"{name} is built without -Wthread-safety: its lock "
+                                           "annotations would be checked on the host only")
+        version = props.get("min_sdk_version")
+        if not (isinstance(version, str) and version.isdigit()
+                and int(version) >= MIN_SDK_VERSION):
+            checker.defect(module["file"], f"{name} has min_sdk_version {version!r}; the NDK calls "
+                                           f"of the code need {MIN_SDK_VERSION}")
+        links_interface = any(re.fullmatch(r"android\.vyr-V\d+-ndk", library)
+                              for library in props.get("shared_libs", []))
+        if props.get("vendor_available") is True and links_interface and not stable:
+            checker.defect(module["file"], f"{name} is vendor_available, but the interface is not "
+                                           "VINTF-stable: a system process linking it would get "
+                                           "BAD_TYPE on its first call (make it vendor: true)")
+        if module["type"] == "cc_fuzz":
+            linked = set(props.get("shared_libs", [])) | set(props.get("static_libs", []))
+            for library in sorted(linked & SENSOR_LIBRARIES):
+                checker.defect(module["file"], f"{name} links {library}: a fuzzer runs on the "
+                                               "sensor doubles, never on the hardware")
 
 
 def check_test_mapping(checker, modules):
@@ -531,6 +584,7 @@ def main():
     check_binder_path(checker)
     check_sources(checker, modules, args.cmake_sources)
     check_host_only(checker, modules)
+    check_conventions(checker, modules)
     check_test_mapping(checker, modules)
     for line in checker.defects:
         print(line)
