@@ -318,6 +318,33 @@ TEST_F(DeviceFilesTest, AFuzzerOnTheSensorLibrariesFails) {
     EXPECT_FAILS_WITH(CheckCopy(), "vyrservice_fuzzer links libubk_range_sensor");
 }
 
+TEST_F(DeviceFilesTest, AnAndroidBpWithoutTheLicenceFails) {
+    Edit("client/Android.bp",
+         "package {\n    default_applicable_licenses: [\"vyrservice_license\"],\n}\n\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "client/Android.bp: has no package { default_applicable_licenses }");
+}
+
+TEST_F(DeviceFilesTest, AMisspeltLicenceFails) {
+    Edit("client/Android.bp", "\"vyrservice_license\"", "\"vyrservice_licence\"");
+    const CheckResult result = CheckCopy();
+    EXPECT_FAILS_WITH(result, "applies vyrservice_licence, which is no license module");
+    EXPECT_NE(result.output.find("depends on undefined module \"vyrservice_licence\""),
+              std::string::npos)
+        << result.output;
+}
+
+TEST_F(DeviceFilesTest, AMissingLicenceTextFailsInSoong) {
+    fs::remove(tree_ / "LICENSE");
+    EXPECT_FAILS_WITH(CheckCopy(), "license_text: \"LICENSE\" does not exist");
+}
+
+TEST_F(DeviceFilesTest, ALicenceKindThatThePlatformDoesNotHaveFailsInSoong) {
+    Edit("Android.bp", "SPDX-license-identifier-Apache-2.0", "SPDX-license-identifier-Apache2");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "depends on undefined module \"SPDX-license-identifier-Apache2\"");
+}
+
 TEST_F(DeviceFilesTest, ACcTestMissingFromTestMappingFails) {
     Edit("TEST_MAPPING", "    {\n      \"name\": \"vyrservice_event_parcel_tests\"\n    }\n", "");
     Edit("TEST_MAPPING", "},\n  ]", "}\n  ]");
@@ -341,7 +368,7 @@ TEST_F(DeviceFilesTest, AnUnknownPropertyFailsInSoong) {
     Edit("apex_update_listener/Android.bp", "    vendor_available: true,",
          "    vendor_availble: true,");
     EXPECT_FAILS_WITH(CheckCopy(),
-                      "apex_update_listener/Android.bp:5:20: unrecognized property "
+                      "apex_update_listener/Android.bp:9:20: unrecognized property "
                       "\"vendor_availble\"");
 }
 

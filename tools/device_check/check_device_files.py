@@ -17,6 +17,8 @@
 - every C++ module is built with -Wthread-safety and min_sdk_version 34 or later, none is
   vendor_available while the interface is not VINTF-stable, and no fuzzer links a sensor library;
 - no Android.bp exists in, or points into, a host-only folder;
+- every Android.bp applies the tree's Apache-2.0 license module (package
+  { default_applicable_licenses });
 - every cc_test names its test suites and is in the root TEST_MAPPING, which names no module that
   does not exist.
 
@@ -536,6 +538,25 @@ def check_conventions(checker, modules):
                                                "sensor doubles, never on the hardware")
 
 
+def check_licences(checker, modules):
+    """Every Android.bp applies the tree's licence module to its modules, as a device tree's
+    build requires of every module."""
+    licences = {m["props"].get("name"): m for m in modules if m["type"] == "license"}
+    for name, module in licences.items():
+        if "SPDX-license-identifier-Apache-2.0" not in module["props"].get("license_kinds", []):
+            checker.defect(module["file"], f"license {name} is not Apache-2.0")
+    for bp in android_bp_files(checker.root):
+        packages = [m for m in modules if m["file"] == bp and m["type"] == "package"]
+        applied = [name for m in packages
+                   for name in m["props"].get("default_applicable_licenses", [])]
+        if not applied:
+            checker.defect(bp, "has no package { default_applicable_licenses } naming the "
+                               "licence module")
+        for name in applied:
+            if name not in licences:
+                checker.defect(bp, f"applies {name}, which is no license module of the tree")
+
+
 def check_test_mapping(checker, modules):
     tests = sorted(m["props"].get("name") for m in modules if m["type"] == "cc_test")
     for module in modules:
@@ -585,6 +606,7 @@ def main():
     check_sources(checker, modules, args.cmake_sources)
     check_host_only(checker, modules)
     check_conventions(checker, modules)
+    check_licences(checker, modules)
     check_test_mapping(checker, modules)
     for line in checker.defects:
         print(line)
