@@ -1,4 +1,7 @@
 #!/usr/bin/env python3
+# Copyright (C) 2026 The vyrservice Authors
+# SPDX-License-Identifier: Apache-2.0
+
 """Checks the device build files against each other and against the code.
 
   check_device_files.py ROOT [--cmake-sources FILE]

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Random transactions into one real VYRService through the binder fuzzing driver: the same source
 // is the device's cc_fuzz (the platform's driver) and the host's libFuzzer target (the host
 // runtime's driver). Both link the sensor doubles, never the sensor libraries: random calls must

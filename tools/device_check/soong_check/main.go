@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // soong_check loads the project's Android.bp files into Soong's own test context, with the
 // platform libraries that a device tree provides declared as stand-ins, and fails on what Soong
 // would refuse: an unknown module type or property, a property of the wrong type, a missing
