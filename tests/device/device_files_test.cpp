@@ -348,6 +348,30 @@ TEST_F(DeviceFilesTest, ALicenceKindThatThePlatformDoesNotHaveFailsInSoong) {
                       "depends on undefined module \"SPDX-license-identifier-Apache2\"");
 }
 
+TEST_F(DeviceFilesTest, ASourceFileWithoutTheLicenceHeaderFails) {
+    WriteFile(tree_ / "host/properties/property_cache.h", "#pragma once\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "host/properties/property_cache.h: has no licence header");
+}
+
+TEST_F(DeviceFilesTest, AnEditedLicenceHeaderFails) {
+    Edit("aidl/android/vyr/Event.aidl", "SPDX-License-Identifier: Apache-2.0",
+         "SPDX-License-Identifier: MIT");
+    EXPECT_FAILS_WITH(CheckCopy(), "aidl/android/vyr/Event.aidl: has no licence header");
+}
+
+TEST_F(DeviceFilesTest, AScriptWithoutTheLicenceHeaderFails) {
+    WriteFile(tree_ / "scripts/bisect", "#!/usr/bin/env bash\necho bisect\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "scripts/bisect: has no licence header");
+}
+
+TEST_F(DeviceFilesTest, TheLicenceHeaderFollowsTheShebangLine) {
+    WriteFile(tree_ / "scripts/bisect",
+              "#!/usr/bin/env bash\n# Copyright (C) 2026 The vyrservice Authors\n"
+              "# SPDX-License-Identifier: Apache-2.0\n\necho bisect\n");
+    const CheckResult result = CheckCopy();
+    EXPECT_EQ(result.exit_status, 0) << result.output;
+}
+
 TEST_F(DeviceFilesTest, ACcTestMissingFromTestMappingFails) {
     Edit("TEST_MAPPING", "    {\n      \"name\": \"vyrservice_event_parcel_tests\"\n    }\n", "");
     Edit("TEST_MAPPING", "},\n  ]", "}\n  ]");

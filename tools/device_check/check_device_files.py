@@ -22,6 +22,7 @@
 - no Android.bp exists in, or points into, a host-only folder;
 - every Android.bp applies the tree's Apache-2.0 license module (package
   { default_applicable_licenses });
+- every source file starts with the licence header (licence_header.py);
 - every cc_test names its test suites and is in the root TEST_MAPPING, which names no module that
   does not exist.
 
@@ -33,6 +34,8 @@ import json
 import os
 import re
 import sys
+
+import licence_header
 
 # Types and attributes of the platform policy (system/sepolicy) that this policy uses.
 PLATFORM_TYPES = {
@@ -560,6 +563,12 @@ def check_licences(checker, modules):
                 checker.defect(bp, f"applies {name}, which is no license module of the tree")
 
 
+def check_licence_headers(checker):
+    for relative in licence_header.missing(checker.root):
+        checker.defect(relative, "has no licence header (tools/device_check/licence_header.py "
+                                 "--fix adds it)")
+
+
 def check_test_mapping(checker, modules):
     tests = sorted(m["props"].get("name") for m in modules if m["type"] == "cc_test")
     for module in modules:
@@ -610,6 +619,7 @@ def main():
     check_host_only(checker, modules)
     check_conventions(checker, modules)
     check_licences(checker, modules)
+    check_licence_headers(checker)
     check_test_mapping(checker, modules)
     for line in checker.defects:
         print(line)
