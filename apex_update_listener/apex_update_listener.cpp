@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #define LOG_TAG "apex_update_listener"
 
 #include "apex_update_listener.h"

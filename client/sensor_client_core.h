@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #pragma once
 
 // What a SensorClient shares with the binder threads that report to it (events, the service's

@@ -1,3 +1,6 @@
+# Copyright (C) 2026 The vyrservice Authors
+# SPDX-License-Identifier: Apache-2.0
+
 # shellcheck shell=bash
 # The Debian 12 packages this project needs, and a function that installs the missing ones.
 # Sourced by scripts/test and scripts/demo; running it alone installs them:

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #define LOG_TAG "vyrservice"
 // Its slices and counters show up in a capture of the camera category.
 #define ATRACE_TAG ATRACE_TAG_CAMERA

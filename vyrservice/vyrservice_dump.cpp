@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The service's dump: what `dumpsys vyrservice` and `vyrctl dump` show.
 
 #include <unistd.h>

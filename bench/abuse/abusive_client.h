@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #pragma once
 
 // The life of one client process that the soak kills somewhere along the way. It reports each

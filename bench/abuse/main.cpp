@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Abuse of the real service binary by hostile and buggy clients, bounded in count and time.
 //
 //   bench_abuse [--service PATH] [soak|headers|stalled]... [--clients N] [--honest N]

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #pragma once
 
 // The abuse scenarios, each against a fresh service process. Each prints its figures and

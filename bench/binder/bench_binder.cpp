@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Round trip of a small two-way binder call against a raw Unix-socket ping-pong of the same
 // size, and the time from SIGKILL of a peer to its death notice; the context switches of both
 // processes per round trip come with each. With VYR_BENCH_SERVICE set to the pid of a running

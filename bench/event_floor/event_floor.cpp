@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The floor of the service's CPU per delivered event: the same pattern of wake-ups with nothing
 // else in it. One thread publishes a sample at the sensor's frame rate; each of N client threads
 // wakes once per client period on a timed condition-variable wait and, when a sample is new to

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Host implementations of the libcutils property readers that Debian's libcutils declares but
 // does not ship. Properties come from the file named by VYR_PROPERTY_FILE.
 

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Linked into every program of a TSan build (see the top-level CMakeLists.txt).
 //
 // ThreadSanitizer (GCC 12 and clang 14) does not intercept pthread_mutex_clocklock, which

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // AmbientLightSensor on the host: a thin front over one AlsSimulator per process.
 
 #include "ambient_light_sensor.h"

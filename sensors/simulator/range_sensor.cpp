@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // ubk::RangeSensor on the host: a thin front over one RangeSimulator per process.
 
 #include "ubk/range_sensor.h"

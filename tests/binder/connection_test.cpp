@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A connection in the looper, fed by a peer on the other end of a socket pair.
 
 #include "connection.h"

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The receive buffer of a connection: what a peer's bytes may make it hold.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The peer process of the cross-process tests.
 //   binder_test_helper serve <name>            publishes a TestService as <name> and an echo
 //                                              binder as <name>.echo, then serves for ever

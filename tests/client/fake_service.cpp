@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A stand-in for vyrservice that the client library's tests start, kill and start again in
 // milliseconds (the real one takes 4 s to register). It prints one line per call on stdout:
 //   "<Method> <arguments> -> <result>"

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The client library: attaching with every setting, re-attaching after the service's restart,
 // refusals, giving up, stopping at any moment; and vyrctl stream across a restart of the real
 // service.

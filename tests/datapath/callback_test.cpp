@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // SetCallback and the notification loop that pushes each new sample to a client's callback.
 
 #include <android/log.h>

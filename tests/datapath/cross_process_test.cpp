@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The real service binary on the simulators, with real client processes (vyrctl): callbacks
 // across processes, two clients on one sensor, and clients that die.
 

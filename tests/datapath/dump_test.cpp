@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The service's dump: its content follows the service's state, its JSON form carries the same
 // values as its text, and it never waits long for a busy service.
 

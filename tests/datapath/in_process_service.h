@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #pragma once
 
 // Fixture: the service built in this process on the sensor test doubles, with no start-up delay

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Calls that a client makes from inside its own OnEvent: they run on the client's notification
 // thread, which must neither join itself nor outlive the entry it reads.
 

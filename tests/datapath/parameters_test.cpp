@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // ConfigureParameters and SetTorchLightState, and the result code of every method for a handle
 // that the service does not know.
 

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // PollOnce: the Event made from each sensor record, and each sample taken once per handle.
 
 #include <android/log.h>

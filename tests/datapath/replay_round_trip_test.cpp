@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // A recording replayed through the real service: the simulator's scene recorded at 100 ms with
 // vyrctl stream --json, replayed (range.replay, als.replay) and recorded again gives the same
 // events in the same order, and a looping replay starts over with the same events.

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #include <gtest/gtest.h>
 #include <sys/wait.h>
 
@@ -113,6 +116,24 @@ TEST_F(DeviceFilesTest, TheCopyPassesUnchanged) {
     EXPECT_EQ(result.exit_status, 0) << result.output;
 }
 
+// A checkout under a linked home is reached through a symbolic link: every step walks the tree
+// behind it.
+TEST_F(DeviceFilesTest, TheCopyPassesThroughASymbolicLink) {
+    const fs::path link = temp_.Path("link");
+    fs::create_directory_symlink(tree_, link);
+    const CheckResult result = Check(link);
+    EXPECT_EQ(result.exit_status, 0) << result.output;
+    EXPECT_NE(result.output.find("Android.bp files load in Soong's test context"), std::string::npos)
+        << result.output;
+}
+
+TEST_F(DeviceFilesTest, ADefectBehindASymbolicLinkIsFound) {
+    Edit("vyrservice/Android.bp", "    vendor: true,\n", "    vendor:true,\n");
+    const fs::path link = temp_.Path("link");
+    fs::create_directory_symlink(tree_, link);
+    EXPECT_FAILS_WITH(Check(link), "vyrservice/Android.bp is not formatted");
+}
+
 TEST_F(DeviceFilesTest, AnAndroidBpThatBpfmtWouldReformatFails) {
     Edit("vyrservice/Android.bp", "    vendor: true,\n", "    vendor:true,\n");
     EXPECT_FAILS_WITH(CheckCopy(), "vyrservice/Android.bp is not formatted");
@@ -169,8 +190,42 @@ TEST_F(DeviceFilesTest, AFileContextsPathThatNothingUsesFails) {
 }
 
 TEST_F(DeviceFilesTest, AServiceNameThatTheCodeDoesNotRegisterFails) {
-    Edit("sepolicy/vndservice_contexts", "vyrservice ", "vyr.service ");
+    Edit("sepolicy/service_contexts", "vyrservice ", "vyr.service ");
     EXPECT_FAILS_WITH(CheckCopy(), "service vyr.service is not registered by the code");
+}
+
+TEST_F(DeviceFilesTest, ARegisteredNameWithoutServiceContextsEntryFails) {
+    WriteFile(tree_ / "sepolicy/service_contexts", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "registered service vyrservice has no context");
+}
+
+TEST_F(DeviceFilesTest, ALabelThatIsNoServiceManagerTypeFails) {
+    Edit("sepolicy/vyrservice.te", "type vyrservice_service, service_manager_type;",
+         "type vyrservice_service, file_type;");
+    EXPECT_FAILS_WITH(CheckCopy(), "does not declare a service_manager_type");
+}
+
+TEST_F(DeviceFilesTest, AVndserviceContextsBesideNdkRegistrationFails) {
+    WriteFile(tree_ / "sepolicy/vndservice_contexts",
+              "vyrservice    u:object_r:vyrservice_service:s0\n");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "sepolicy/vndservice_contexts: the code registers through libbinder_ndk");
+}
+
+TEST_F(DeviceFilesTest, VndbinderUseBesideNdkRegistrationFails) {
+    Append("sepolicy/vyrservice.te", "vndbinder_use(vyrservice)\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "vndbinder_use(vyrservice): the code registers through");
+}
+
+TEST_F(DeviceFilesTest, AClientAttributeWithoutBinderUseFails) {
+    Edit("sepolicy/vyrservice.te", "binder_use(vyrservice_client)\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "client vyrservice_client finds vyrservice_service but has no binder_use");
+}
+
+TEST_F(DeviceFilesTest, AServiceDomainWithoutBinderUseFails) {
+    Edit("sepolicy/vyrservice.te", "binder_use(vyrservice)\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice adds vyrservice_service but has no binder_use");
 }
 
 TEST_F(DeviceFilesTest, ARenamedRegistrationFails) {
@@ -231,6 +286,92 @@ TEST_F(DeviceFilesTest, AModuleThatReachesIntoTheHostRuntimeFails) {
     EXPECT_FAILS_WITH(CheckCopy(), "libvyrservice reaches the host-only host/properties");
 }
 
+TEST_F(DeviceFilesTest, AVyrctlSourceMissingFromAndroidBpFails) {
+    WriteFile(tree_ / "tools/vyrctl/record_command.cpp", "\n");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "tools/vyrctl/record_command.cpp: is in no module of Android.bp");
+}
+
+TEST_F(DeviceFilesTest, AModuleWithoutThreadSafetyAnalysisFails) {
+    Edit("Android.bp", "        \"-Wthread-safety\",\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "libvyrservice is built without -Wthread-safety");
+}
+
+TEST_F(DeviceFilesTest, AModuleWithoutMinSdkVersionFails) {
+    Edit("Android.bp", "    min_sdk_version: \"34\",\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice has min_sdk_version None");
+}
+
+TEST_F(DeviceFilesTest, AMinSdkVersionBelowTheNdkCallsFails) {
+    Edit("Android.bp", "    min_sdk_version: \"34\",", "    min_sdk_version: \"31\",");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice has min_sdk_version '31'");
+}
+
+TEST_F(DeviceFilesTest, AVendorAvailableClientLibraryFails) {
+    Edit("client/Android.bp", "    vendor: true,", "    vendor_available: true,");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "libvyrclient is vendor_available, but the interface is not VINTF-stable");
+}
+
+TEST_F(DeviceFilesTest, AFuzzerOnTheSensorLibrariesFails) {
+    Edit("tests/service/Android.bp", "        \"libvyr_sensor_doubles\",\n", "");
+    Edit("tests/service/Android.bp", "    srcs: [\"fuzz/vyrservice_fuzzer.cpp\"],\n",
+         "    srcs: [\"fuzz/vyrservice_fuzzer.cpp\"],\n    shared_libs: "
+         "[\"libubk_range_sensor\"],\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice_fuzzer links libubk_range_sensor");
+}
+
+TEST_F(DeviceFilesTest, AnAndroidBpWithoutTheLicenceFails) {
+    Edit("client/Android.bp",
+         "package {\n    default_applicable_licenses: [\"vyrservice_license\"],\n}\n\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "client/Android.bp: has no package { default_applicable_licenses }");
+}
+
+TEST_F(DeviceFilesTest, AMisspeltLicenceFails) {
+    Edit("client/Android.bp", "\"vyrservice_license\"", "\"vyrservice_licence\"");
+    const CheckResult result = CheckCopy();
+    EXPECT_FAILS_WITH(result, "applies vyrservice_licence, which is no license module");
+    EXPECT_NE(result.output.find("depends on undefined module \"vyrservice_licence\""),
+              std::string::npos)
+        << result.output;
+}
+
+TEST_F(DeviceFilesTest, AMissingLicenceTextFailsInSoong) {
+    fs::remove(tree_ / "LICENSE");
+    EXPECT_FAILS_WITH(CheckCopy(), "license_text: \"LICENSE\" does not exist");
+}
+
+TEST_F(DeviceFilesTest, ALicenceKindThatThePlatformDoesNotHaveFailsInSoong) {
+    Edit("Android.bp", "SPDX-license-identifier-Apache-2.0", "SPDX-license-identifier-Apache2");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "depends on undefined module \"SPDX-license-identifier-Apache2\"");
+}
+
+TEST_F(DeviceFilesTest, ASourceFileWithoutTheLicenceHeaderFails) {
+    WriteFile(tree_ / "host/properties/property_cache.h", "#pragma once\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "host/properties/property_cache.h: has no licence header");
+}
+
+TEST_F(DeviceFilesTest, AnEditedLicenceHeaderFails) {
+    Edit("aidl/android/vyr/Event.aidl", "SPDX-License-Identifier: Apache-2.0",
+         "SPDX-License-Identifier: MIT");
+    EXPECT_FAILS_WITH(CheckCopy(), "aidl/android/vyr/Event.aidl: has no licence header");
+}
+
+TEST_F(DeviceFilesTest, AScriptWithoutTheLicenceHeaderFails) {
+    WriteFile(tree_ / "scripts/bisect", "#!/usr/bin/env bash\necho bisect\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "scripts/bisect: has no licence header");
+}
+
+TEST_F(DeviceFilesTest, TheLicenceHeaderFollowsTheShebangLine) {
+    WriteFile(tree_ / "scripts/bisect",
+              "#!/usr/bin/env bash\n# Copyright (C) 2026 The vyrservice Authors\n"
+              "# SPDX-License-Identifier: Apache-2.0\n\necho bisect\n");
+    const CheckResult result = CheckCopy();
+    EXPECT_EQ(result.exit_status, 0) << result.output;
+}
+
 TEST_F(DeviceFilesTest, ACcTestMissingFromTestMappingFails) {
     Edit("TEST_MAPPING", "    {\n      \"name\": \"vyrservice_event_parcel_tests\"\n    }\n", "");
     Edit("TEST_MAPPING", "},\n  ]", "}\n  ]");
@@ -251,13 +392,16 @@ TEST_F(DeviceFilesTest, ACcTestWithoutTestSuitesFails) {
 }
 
 TEST_F(DeviceFilesTest, AnUnknownPropertyFailsInSoong) {
-    Edit("client/Android.bp", "    vendor_available: true,", "    vendor_availble: true,");
+    Edit("apex_update_listener/Android.bp", "    vendor_available: true,",
+         "    vendor_availble: true,");
     EXPECT_FAILS_WITH(CheckCopy(),
-                      "client/Android.bp:5:20: unrecognized property \"vendor_availble\"");
+                      "apex_update_listener/Android.bp:9:20: unrecognized property "
+                      "\"vendor_availble\"");
 }
 
 TEST_F(DeviceFilesTest, APropertyOfTheWrongTypeFailsInSoong) {
-    Edit("client/Android.bp", "    vendor_available: true,", "    vendor_available: \"yes\",");
+    Edit("apex_update_listener/Android.bp", "    vendor_available: true,",
+         "    vendor_available: \"yes\",");
     EXPECT_FAILS_WITH(CheckCopy(),
                       "can't assign string value to bool property \"vendor_available\"");
 }

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The hostname is per UTS namespace and unshare() moves only the calling thread; doing it first
 // thing in main(), before gtest or the binder runtime start a thread, puts the whole test process
 // in the namespace, so that sethostname() never touches the machine's own name. A mount namespace

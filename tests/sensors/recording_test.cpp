@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Recordings (vyrctl stream --json) read back into the sensor libraries' records: field by field
 // as the service's conversion reads them, on the recording's own time line, and bad files refused
 // with the file and line.

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The sensor libraries' headers assert their record layouts at compile time; compiling them here
 // keeps those checks in the build. The runtime checks restate the sizes the service copies.
 

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The watcher that tells the service when a client process has ended.
 
 #include "client_process_watcher.h"

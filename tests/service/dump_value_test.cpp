@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The dump's value tree: the same values as text for a person and as JSON for a script.
 
 #include "dump_value.h"

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The real vyrservice binary in a process of its own, reached over the host binder runtime.
 
 #include <aidl/android/vyr/BnEventCallback.h>

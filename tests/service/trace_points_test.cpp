@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The service's trace points: slices around each sensor read, delivery and work item, and
 // counters of each mode's enable count and active period. The test defines libcutils' trace
 // functions itself, which this executable's calls reach instead of the library's (that do

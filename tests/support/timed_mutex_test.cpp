@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // std::timed_mutex as the service's API lock uses it. In TSan builds its lock goes through the
 // host/tsan stand-in for pthread_mutex_clocklock; these tests check that stand-in's deadlines and
 // that TSan sees the lock (a missed lock shows as a reported race on the counter).

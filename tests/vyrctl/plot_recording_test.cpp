@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // tools/plot-recording on the shipped scene: a PNG of the expected size; a bad file is refused
 // with its line.
 

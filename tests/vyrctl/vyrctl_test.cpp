@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Unit tests of vyrctl's parsing, decoding and shell, against an in-process fake service.
 
 #include <aidl/android/vyr/BnVYRService.h>

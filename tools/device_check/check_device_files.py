@@ -1,4 +1,7 @@
 #!/usr/bin/env python3
+# Copyright (C) 2026 The vyrservice Authors
+# SPDX-License-Identifier: Apache-2.0
+
 """Checks the device build files against each other and against the code.
 
   check_device_files.py ROOT [--cmake-sources FILE]
@@ -6,12 +9,20 @@
 - every SELinux type, attribute or property type that the policy uses is declared by the policy
   or is one of the platform's (PLATFORM_TYPES);
 - every path in file_contexts and genfs_contexts is the installed binary or a path the code opens;
-- vndservice_contexts names the service that the code registers;
+- the policy is written for the binder that the code registers on: libbinder_ndk always reaches
+  servicemanager on /dev/binder, so service_contexts labels every name that the code registers
+  (and nothing else) with a service_manager_type, the registering domain and every client
+  attribute have binder_use, and no vndservice_contexts or vndbinder_use is left;
 - the init service runs the path where Android.bp installs the vendor binary that carries the .rc;
-- every .cpp of the service, the listener and the client library is in Android.bp, and (with
-  --cmake-sources, written
-  by the host build) the host build compiles the same sources for each library;
+- every .cpp of the service, the listener, the client library, vyrctl and the sensor doubles is
+  in Android.bp, and (with --cmake-sources, written by the host build) the host build compiles the
+  same sources for each library;
+- every C++ module is built with -Wthread-safety and min_sdk_version 34 or later, none is
+  vendor_available while the interface is not VINTF-stable, and no fuzzer links a sensor library;
 - no Android.bp exists in, or points into, a host-only folder;
+- every Android.bp applies the tree's Apache-2.0 license module (package
+  { default_applicable_licenses });
+- every source file starts with the licence header (licence_header.py);
 - every cc_test names its test suites and is in the root TEST_MAPPING, which names no module that
   does not exist.
 
@@ -24,6 +35,8 @@ import os
 import re
 import sys
 
+import licence_header
+
 # Types and attributes of the platform policy (system/sepolicy) that this policy uses.
 PLATFORM_TYPES = {
     "apex_info_file",
@@ -33,17 +46,30 @@ PLATFORM_TYPES = {
     "exec_type",
     "file_type",
     "fs_type",
+    "service_manager_type",
+    "shell",
     "sysfs_type",
     "vendor_file_type",
-    "vndservice_manager_type",
 }
 # Policy macros that declare their first argument.
 DECLARING_MACROS = {"vendor_internal_prop", "vendor_restricted_prop", "vendor_public_prop"}
+# Policy macros whose argument is policy kept for some builds only (m4 quoted).
+BUILD_VARIANT_MACROS = ("userdebug_or_eng", "eng", "user_only")
 # Folders that only the host build uses.
-HOST_ONLY = ["host", "sensors/simulator", "sensors/doubles", "tools/sandbox"]
+HOST_ONLY = ["host", "sensors/simulator", "tools/sandbox"]
 # Folders whose every .cpp belongs to a library or binary of both builds (the service, the
 # listener, the client library).
 SERVICE_FOLDERS = ["vyrservice", "apex_update_listener", "client"]
+# Further folders whose every .cpp is in a module of the device build: vyrctl, and the sensor
+# doubles that the device fuzzer runs on.
+DEVICE_FOLDERS = SERVICE_FOLDERS + ["tools/vyrctl", "sensors/doubles"]
+# Module types that compile C++ of this tree.
+CC_MODULE_TYPES = {"cc_library", "cc_library_static", "cc_library_shared", "cc_binary", "cc_test",
+                   "cc_fuzz"}
+# The closed sensor libraries: what only the service binary may link.
+SENSOR_LIBRARIES = {"libambient_light_sensor", "libubk_range_sensor"}
+# The lowest platform version whose NDK has every call that the code makes.
+MIN_SDK_VERSION = 34
 # A vendor cc_binary is installed here.
 VENDOR_BIN = "/vendor/bin/"
 
@@ -163,16 +189,26 @@ def load_modules(checker):
             modules.append(module)
     defaults = {m["props"].get("name"): m["props"] for m in modules if m["type"] == "cc_defaults"}
     for module in modules:
-        for name in module["props"].get("defaults", []):
-            for key, value in defaults.get(name, {}).items():
-                own = module["props"].get(key)
-                if key == "name":
-                    continue
-                if own is None:
-                    module["props"][key] = value
-                elif isinstance(own, list) and isinstance(value, list):
-                    module["props"][key] = value + own
+        apply_defaults(module["props"], defaults, set())
     return modules
+
+
+def apply_defaults(props, defaults, seen):
+    """Merges the properties of the defaults that props names, and of those that they name."""
+    for name in props.get("defaults", []):
+        if name in seen or name not in defaults:
+            continue
+        seen.add(name)
+        inherited = dict(defaults[name])
+        apply_defaults(inherited, defaults, seen)
+        for key, value in inherited.items():
+            own = props.get(key)
+            if key in ("name", "defaults"):
+                continue
+            if own is None:
+                props[key] = value
+            elif isinstance(own, list) and isinstance(value, list):
+                props[key] = value + [v for v in own if v not in value]
 
 
 def strings_in(value):
@@ -238,6 +274,19 @@ def without_comments(text):
     return re.sub(r"#[^\n]*", "", text)
 
 
+def policy_text(checker, te):
+    """A .te file without comments, with the rules of build-variant macros unwrapped."""
+    text = without_comments(checker.read(te))
+    return re.sub(r"\b(?:" + "|".join(BUILD_VARIANT_MACROS) + r")\s*\(\s*`(.*?)'\s*\)", r"\1",
+                  text, flags=re.S)
+
+
+def macro_calls(text, macro):
+    """The argument lists of every call of one policy macro."""
+    return [[a.strip() for a in arguments.split(",")]
+            for arguments in re.findall(r"\b" + macro + r"\s*\(([^)]*)\)", text)]
+
+
 def context_type(context):
     parts = context.split(":")
     return parts[2] if len(parts) >= 4 else None
@@ -246,7 +295,7 @@ def context_type(context):
 def check_policy_types(checker):
     declared, used = set(), []
     for te in policy_files(checker, suffix=".te"):
-        text = without_comments(checker.read(te))
+        text = policy_text(checker, te)
         for kind, body in re.findall(r"\b(type|attribute|typeattribute)\s+([^;]+);", text):
             names = [n.strip() for n in body.split(",")]
             if kind == "typeattribute":
@@ -294,20 +343,69 @@ def check_policy_paths(checker, binary_paths):
                 checker.defect(contexts, f"{path} is not a path that the code opens")
 
 
-def check_service_name(checker):
+def context_entries(checker, name):
+    """(name, type) of every line of one of the policy's contexts files."""
+    entries = []
+    for contexts in policy_files(checker, name=name):
+        for line in without_comments(checker.read(contexts)).splitlines():
+            fields = line.split()
+            if len(fields) >= 2:
+                entries.append((fields[0], context_type(fields[1])))
+    return entries
+
+
+def check_binder_path(checker):
     registered = registered_service_names(checker)
     if not registered:
         checker.defect("vyrservice", "no AServiceManager_addService call with a name found")
-    listed = set()
-    for contexts in policy_files(checker, name="vndservice_contexts"):
-        for line in without_comments(checker.read(contexts)).splitlines():
-            if line.split():
-                listed.add(line.split()[0])
-    for name in sorted(listed - registered):
-        checker.defect("sepolicy/vndservice_contexts", f"service {name} is not registered by the "
-                                                       f"code (it registers {sorted(registered)})")
+        return
+    # libbinder_ndk has no way to reach vndservicemanager: a vendor process that registers through
+    # it talks /dev/binder, whose rules are binder_use and service_contexts.
+    if policy_files(checker, name="vndservice_contexts"):
+        checker.defect("sepolicy/vndservice_contexts", "the code registers through libbinder_ndk, "
+                       "which reaches servicemanager, not vndservicemanager: label the name in "
+                       "service_contexts")
+    texts = {te: policy_text(checker, te) for te in policy_files(checker, suffix=".te")}
+    for te, text in texts.items():
+        for arguments in macro_calls(text, "vndbinder_use"):
+            checker.defect(te, f"vndbinder_use({', '.join(arguments)}): the code registers through "
+                               "libbinder_ndk, which uses /dev/binder (binder_use)")
+    service_types = set()
+    binder_users = set()
+    for text in texts.values():
+        for name, kinds in re.findall(r"\btype\s+(\w+)\s*,([^;]*);", text):
+            if "service_manager_type" in [k.strip() for k in kinds.split(",")]:
+                service_types.add(name)
+        binder_users.update(arguments[0] for arguments in macro_calls(text, "binder_use"))
+    entries = context_entries(checker, "service_contexts")
+    listed = {name for name, _ in entries}
+    for name, label in entries:
+        if name not in registered:
+            checker.defect("sepolicy/service_contexts", f"service {name} is not registered by the "
+                                                        f"code (it registers {sorted(registered)})")
+        if label not in service_types:
+            checker.defect("sepolicy/service_contexts", f"{name} is labelled {label}, which the "
+                                                        "policy does not declare a "
+                                                        "service_manager_type")
     for name in sorted(registered - listed):
-        checker.defect("sepolicy/vndservice_contexts", f"registered service {name} has no context")
+        checker.defect("sepolicy/service_contexts", f"registered service {name} has no context: "
+                                                    "servicemanager would label it "
+                                                    "default_android_service, which no vendor "
+                                                    "domain may add")
+    labels = {label for _, label in entries}
+    for te, text in texts.items():
+        for arguments in macro_calls(text, "add_service"):
+            if len(arguments) == 2 and arguments[1] in labels and arguments[0] not in binder_users:
+                checker.defect(te, f"{arguments[0]} adds {arguments[1]} but has no binder_use")
+        # Whoever looks a service of this policy up is its client, and needs binder_use to reach
+        # servicemanager at all.
+        for subjects, target in re.findall(
+                r"\ballow\s+([^;:]+?)\s+(\w+)\s*:\s*service_manager\s+[^;]*\bfind\b", text):
+            if target not in labels:
+                continue
+            for subject in re.findall(r"[A-Za-z_]\w*", subjects):
+                if subject not in binder_users and subject not in PLATFORM_TYPES:
+                    checker.defect(te, f"client {subject} finds {target} but has no binder_use")
 
 
 # --- init ----------------------------------------------------------------------------------------
@@ -372,7 +470,7 @@ def check_sources(checker, modules, cmake_sources):
         for source in module["props"].get("srcs", []):
             listed.setdefault(os.path.normpath(os.path.join(module["dir"], source)), []).append(
                 module["props"].get("name"))
-    for folder in SERVICE_FOLDERS:
+    for folder in DEVICE_FOLDERS:
         path = os.path.join(checker.root, folder)
         for directory, _, files in os.walk(path):
             for name in sorted(files):
@@ -413,6 +511,62 @@ def check_host_only(checker, modules):
             if any(target == f or target.startswith(f + "/") for f in HOST_ONLY):
                 checker.defect(module["file"], f"{module['props'].get('name')} reaches the "
                                                f"host-only {target}")
+
+
+def check_conventions(checker, modules):
+    """What a device tree expects of the modules: checked locks, the platform version, the
+    partition that the interface's stability allows, and no hardware under a fuzzer."""
+    stable = any(m["type"] == "aidl_interface" and m["props"].get("stability") == "vintf"
+                 for m in modules)
+    for module in modules:
+        props = module["props"]
+        name = props.get("name")
+        if module["type"] not in CC_MODULE_TYPES:
+            continue
+        if "-Wthread-safety" not in props.get("cflags", []):
+            checker.defect(module["file"], f"{name} is built without -Wthread-safety: its lock "
+                                           "annotations would be checked on the host only")
+        version = props.get("min_sdk_version")
+        if not (isinstance(version, str) and version.isdigit()
+                and int(version) >= MIN_SDK_VERSION):
+            checker.defect(module["file"], f"{name} has min_sdk_version {version!r}; the NDK calls "
+                                           f"of the code need {MIN_SDK_VERSION}")
+        links_interface = any(re.fullmatch(r"android\.vyr-V\d+-ndk", library)
+                              for library in props.get("shared_libs", []))
+        if props.get("vendor_available") is True and links_interface and not stable:
+            checker.defect(module["file"], f"{name} is vendor_available, but the interface is not "
+                                           "VINTF-stable: a system process linking it would get "
+                                           "BAD_TYPE on its first call (make it vendor: true)")
+        if module["type"] == "cc_fuzz":
+            linked = set(props.get("shared_libs", [])) | set(props.get("static_libs", []))
+            for library in sorted(linked & SENSOR_LIBRARIES):
+                checker.defect(module["file"], f"{name} links {library}: a fuzzer runs on the "
+                                               "sensor doubles, never on the hardware")
+
+
+def check_licences(checker, modules):
+    """Every Android.bp applies the tree's licence module to its modules, as a device tree's
+    build requires of every module."""
+    licences = {m["props"].get("name"): m for m in modules if m["type"] == "license"}
+    for name, module in licences.items():
+        if "SPDX-license-identifier-Apache-2.0" not in module["props"].get("license_kinds", []):
+            checker.defect(module["file"], f"license {name} is not Apache-2.0")
+    for bp in android_bp_files(checker.root):
+        packages = [m for m in modules if m["file"] == bp and m["type"] == "package"]
+        applied = [name for m in packages
+                   for name in m["props"].get("default_applicable_licenses", [])]
+        if not applied:
+            checker.defect(bp, "has no package { default_applicable_licenses } naming the "
+                               "licence module")
+        for name in applied:
+            if name not in licences:
+                checker.defect(bp, f"applies {name}, which is no license module of the tree")
+
+
+def check_licence_headers(checker):
+    for relative in licence_header.missing(checker.root):
+        checker.defect(relative, "has no licence header (tools/device_check/licence_header.py "
+                                 "--fix adds it)")
 
 
 def check_test_mapping(checker, modules):
@@ -460,9 +614,12 @@ def main():
     binary_paths = check_init_scripts(checker, modules)
     check_policy_types(checker)
     check_policy_paths(checker, binary_paths)
-    check_service_name(checker)
+    check_binder_path(checker)
     check_sources(checker, modules, args.cmake_sources)
     check_host_only(checker, modules)
+    check_conventions(checker, modules)
+    check_licences(checker, modules)
+    check_licence_headers(checker)
     check_test_mapping(checker, modules)
     for line in checker.defects:
         print(line)

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // vyr-sandbox: runs the unmodified service binary with the device paths it expects, backed by
 // things the caller controls.
 //

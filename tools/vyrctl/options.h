@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #pragma once
 
 // Command-line parsing of vyrctl: numbers are checked strictly, so a typo is an error, not a zero.

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #pragma once
 
 // `vyrctl stream`: opens one sensor, prints every event, and disables and closes it on the way

@@ -1,18 +1,62 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 package android.vyr;
 
 import android.vyr.Event;
 import android.vyr.IEventCallback;
 
-// Each method's result code is its return value, so the generated C++ carries it as the last
-// out-parameter; the binder status itself is always OK.
+/**
+ * The sensors of the service "vyrservice", shared between clients: a client opens a handle for
+ * one sensor mode (1: spectral ambient light, 3: range), enables it with a period, and takes
+ * events by PollOnce or through an IEventCallback.
+ *
+ * Result codes: each method's result code is its return value, so the generated C++ carries it
+ * as the last out-parameter; the binder status itself is always OK, also when the call failed.
+ * Codes are 0, a handle, -1 or a negated errno: -17 EEXIST, -19 ENODEV, -22 EINVAL, -38 ENOSYS,
+ * -61 ENODATA. Methods without a result report nothing.
+ *
+ * Threading: every call runs on a binder thread of the service, and all of them one at a time
+ * under one lock; a call that waits more than 10 s for it ends the service. Periods are
+ * milliseconds on the service's steady clock.
+ */
 interface IVYRService {
+    /**
+     * A new client of `mode`: its handle (positive), or -22 for a mode other than 1 and 3, -1
+     * with ten clients open, -19 when the mode's sensor is absent. Touches no sensor.
+     */
     int Open(int mode);
+    /** Ends the client; an unknown handle is ignored. Call Disable first. */
     void Close(int handle);
+    /**
+     * Samples the client's mode every `period` ms (below 1: 1000 ms); the mode samples at the
+     * smallest period that its enabled clients asked for. 0, -38 for an unknown handle, -17 when
+     * already enabled. The sensor is switched on after the call returns.
+     */
     int Enable(int handle, int period);
+    /** Withdraws the client's enable request; a disabled or unknown client is left as it is. */
     void Disable(int handle);
+    /**
+     * The client's event sink, linked to its death: 0, -22 for an unknown handle, -1 while the
+     * client is enabled (set it before Enable).
+     */
     int SetCallback(int handle, IEventCallback callback);
+    /**
+     * Light mode only: the light sensor is switched off between samples while this is set and
+     * one client is open. The setting is the service's, not the client's: the last caller wins.
+     * 0, -38 for an unknown handle, -22 for a range client.
+     */
     int EnableLowPower(int handle, boolean enable);
+    /**
+     * The mode's latest sample, if this handle has not taken it yet: 0 with `event` filled, -61
+     * when there is no new valid sample (`event` is left as it was), -22 for an unknown handle.
+     */
     int PollOnce(int handle, out Event event);
+    /**
+     * Range clients only: eleven control values for the range sensor. 0, -38 for an unknown
+     * handle, -22 for a light client or another count of values.
+     */
     int ConfigureParameters(int handle, in int[] params);
+    /** Tells the light sensor the camera torch's state (its low 8 bits); no handle needed. */
     void SetTorchLightState(int state);
 }

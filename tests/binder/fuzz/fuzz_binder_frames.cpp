@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Feeds arbitrary bytes to the runtime's decoders. The first byte picks the target:
 //   0: frame headers and object tables
 //   1: a byte stream from a peer, through a real connection

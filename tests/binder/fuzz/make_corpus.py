@@ -1,4 +1,7 @@
 #!/usr/bin/env python3
+# Copyright (C) 2026 The vyrservice Authors
+# SPDX-License-Identifier: Apache-2.0
+
 """Writes the seed corpus of fuzz_binder_frames: one valid input of each kind."""
 import os
 import struct

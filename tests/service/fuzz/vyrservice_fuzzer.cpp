@@ -1,6 +1,10 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // Random transactions into one real VYRService through the binder fuzzing driver: the same source
-// is the device's cc_fuzz (real sensor libraries, the platform's driver) and the host's libFuzzer
-// target (sensor doubles, the host runtime's driver).
+// is the device's cc_fuzz (the platform's driver) and the host's libFuzzer target (the host
+// runtime's driver). Both link the sensor doubles, never the sensor libraries: random calls must
+// not drive the hardware.
 #include <android/log.h>
 #include <fuzzbinder/libbinder_ndk_driver.h>
 #include <fuzzer/FuzzedDataProvider.h>

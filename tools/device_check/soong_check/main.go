@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // soong_check loads the project's Android.bp files into Soong's own test context, with the
 // platform libraries that a device tree provides declared as stand-ins, and fails on what Soong
 // would refuse: an unknown module type or property, a property of the wrong type, a missing
@@ -17,6 +20,9 @@ import (
 
 	"android/soong/android"
 	"android/soong/cc"
+
+	"github.com/google/blueprint"
+	"github.com/google/blueprint/proptools"
 )
 
 // What the device tree and the platform provide: libraries as the modules name them, and the
@@ -89,6 +95,11 @@ cc_library_static {
 	system_shared_libs: [],
 	stl: "none",
 }
+license_kind {
+	name: "SPDX-license-identifier-Apache-2.0",
+	conditions: ["notice"],
+	url: "https://spdx.org/licenses/Apache-2.0.html",
+}
 cc_defaults {
 	name: "service_fuzzer_defaults",
 	static_libs: ["libbinder_random_parcel"],
@@ -146,15 +157,101 @@ func aidlInterfaceFactory() android.Module {
 
 func (m *aidlInterface) GenerateAndroidBuildActions(ctx android.ModuleContext) {}
 
+// The licence module types came to Soong after Debian's snapshot: these stand-ins take their
+// properties and resolve what they name, so a misspelt licence, a licence kind that the platform
+// does not have or a licence text that does not exist still fails.
+type licenseDepTag struct{ blueprint.BaseDependencyTag }
+
+type licenseKind struct {
+	android.ModuleBase
+	properties struct {
+		Conditions []string
+		Url        string
+	}
+}
+
+func licenseKindFactory() android.Module {
+	m := &licenseKind{}
+	m.AddProperties(&m.properties)
+	android.InitAndroidModule(m)
+	return m
+}
+
+func (m *licenseKind) GenerateAndroidBuildActions(ctx android.ModuleContext) {}
+
+type license struct {
+	android.ModuleBase
+	properties struct {
+		License_kinds    []string
+		License_text     []string
+		Copyright_notice *string
+		Package_name     *string
+	}
+}
+
+func licenseFactory() android.Module {
+	m := &license{}
+	m.AddProperties(&m.properties)
+	android.InitAndroidModule(m)
+	return m
+}
+
+func (m *license) DepsMutator(ctx android.BottomUpMutatorContext) {
+	ctx.AddDependency(ctx.Module(), licenseDepTag{}, m.properties.License_kinds...)
+}
+
+// The files of the tree, by path from its root. Soong's test context takes any source path as
+// existing, so the licence text is looked up here.
+var treeFiles map[string][]byte
+
+func (m *license) GenerateAndroidBuildActions(ctx android.ModuleContext) {
+	for _, text := range m.properties.License_text {
+		if _, ok := treeFiles[filepath.Join(ctx.ModuleDir(), text)]; !ok {
+			ctx.PropertyErrorf("license_text", "%q does not exist", text)
+		}
+	}
+}
+
+// packageModule stands in for the package module: one per Android.bp, named after its folder.
+type packageModule struct {
+	android.ModuleBase
+	properties struct {
+		Default_visibility          []string
+		Default_applicable_licenses []string
+	}
+}
+
+func packageFactory() android.Module {
+	m := &packageModule{}
+	m.AddProperties(&m.properties)
+	android.InitAndroidModule(m)
+	android.AddLoadHook(m, func(ctx android.LoadHookContext) {
+		ctx.AppendProperties(&struct{ Name *string }{proptools.StringPtr("//" + ctx.ModuleDir())})
+	})
+	return m
+}
+
+func (m *packageModule) DepsMutator(ctx android.BottomUpMutatorContext) {
+	ctx.AddDependency(ctx.Module(), licenseDepTag{}, m.properties.Default_applicable_licenses...)
+}
+
+func (m *packageModule) GenerateAndroidBuildActions(ctx android.ModuleContext) {}
+
 func main() {
 	if len(os.Args) != 2 {
 		fmt.Fprintln(os.Stderr, "usage: soong_check ROOT")
 		os.Exit(2)
 	}
-	root := os.Args[1]
+	// Walk does not follow a root that is a symbolic link: walk the folder it points to.
+	root, err := filepath.EvalSymlinks(os.Args[1])
+	if err != nil {
+		fmt.Fprintln(os.Stderr, "soong_check:", err)
+		os.Exit(2)
+	}
 	files := map[string][]byte{}
+	treeFiles = files
 	var blueprints []string
-	err := filepath.Walk(root, func(path string, info os.FileInfo, err error) error {
+	err = filepath.Walk(root, func(path string, info os.FileInfo, err error) error {
 		if err != nil {
 			return err
 		}
@@ -193,6 +290,9 @@ func main() {
 	config := cc.TestConfig(buildDir, android.Android, nil, "", files)
 	ctx := cc.CreateTestContext()
 	ctx.RegisterModuleType("aidl_interface", aidlInterfaceFactory)
+	ctx.RegisterModuleType("license_kind", licenseKindFactory)
+	ctx.RegisterModuleType("license", licenseFactory)
+	ctx.RegisterModuleType("package", packageFactory)
 	ctx.Register(config)
 
 	report := func(stage string, errs []error) {
