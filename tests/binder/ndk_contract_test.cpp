@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The binder NDK's contracts that the service and the client library rely on, checked across
 // processes through the NDK alone: the same tests run against a device's libbinder_ndk.
 

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 #pragma once
 
 // A test that runs the helper (binder_test_helper) in other processes and talks to it through

@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The service on the sensor test doubles, in a process of its own, and a client of it: what the
 // cross-process suite starts beside itself, on the host and on a device alike.
 //

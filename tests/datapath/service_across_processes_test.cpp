@@ -1,3 +1,6 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
 // The service on the sensor doubles in a process of its own, reached through the binder NDK
 // alone: open, enable, poll, callbacks, calls nested in OnEvent, the death of a client, and the
 // client library's re-attach across a restart of the service. The same suite runs against a
