@@ -11,6 +11,7 @@ ClientEntry::~ClientEntry() {
 
 void ClientEntry::StopNotify() {
     state = kClientDisabled;
+    if (sample_signal) sample_signal->Stop();
     if (notify_cv) {
         // Taking the mutex once orders the state change before any wait that has not yet begun,
         // so the notification cannot fall between the thread's test of `state` and its wait.
@@ -31,6 +32,7 @@ void ClientEntry::Disable() {
     notify_thread.reset();
     notify_cv.reset();
     notify_mutex.reset();
+    sample_signal.reset();
 }
 
 }  // namespace binder

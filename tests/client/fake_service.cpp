@@ -121,6 +121,16 @@ class FakeService : public aidl::android::vyr::BnVYRService {
         Say("SetCallback " + std::to_string(handle) + " -> " + std::to_string(*result));
         return ndk::ScopedAStatus::ok();
     }
+    // Stands for a service of version 1's methods only.
+    ndk::ScopedAStatus EnableOnSample(int32_t handle, int32_t, int32_t, int32_t* result) override {
+        *result = -38;
+        Say("EnableOnSample " + std::to_string(handle) + " -> " + std::to_string(*result));
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus Flush(int32_t, int32_t* result) override {
+        *result = -38;
+        return ndk::ScopedAStatus::ok();
+    }
     ndk::ScopedAStatus EnableLowPower(int32_t handle, bool enable, int32_t* result) override {
         // As the service does for range handles.
         *result = -22;

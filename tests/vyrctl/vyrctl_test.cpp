@@ -54,6 +54,14 @@ class FakeService : public aidl::android::vyr::BnVYRService {
         *result = -22;
         return ndk::ScopedAStatus::ok();
     }
+    ndk::ScopedAStatus EnableOnSample(int32_t, int32_t, int32_t, int32_t* result) override {
+        *result = -38;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus Flush(int32_t, int32_t* result) override {
+        *result = -38;
+        return ndk::ScopedAStatus::ok();
+    }
     ndk::ScopedAStatus PollOnce(int32_t handle, Event* event, int32_t* result) override {
         if (handle != 42) {
             *result = -61;

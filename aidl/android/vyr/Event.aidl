@@ -8,4 +8,7 @@ parcelable Event {
     float value0;
     float value1;
     float[] data;
+    // When the sensor library returned the reading, in CLOCK_BOOTTIME nanoseconds: the clock of
+    // camera frames (elapsedRealtimeNanos), so that a reading can be matched to a frame.
+    long boottime;
 }
