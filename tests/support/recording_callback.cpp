@@ -44,6 +44,11 @@ std::vector<size_t> RecordingCallback::BatchSizes() {
     return batch_sizes_;
 }
 
+bool RecordingCallback::WaitForBatches(size_t count, std::chrono::milliseconds timeout) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    return changed_.wait_for(lock, timeout, [&] { return batch_sizes_.size() >= count; });
+}
+
 std::vector<size_t> RecordingCallback::Flushes() {
     std::lock_guard<std::mutex> lock(mutex_);
     return flushes_;

@@ -25,6 +25,8 @@ class RecordingCallback : public aidl::android::vyr::BnEventCallback {
     // Waits until at least `count` events arrived; false on time-out.
     bool WaitForEvents(size_t count, std::chrono::milliseconds timeout);
     std::vector<size_t> BatchSizes();
+    // Waits until at least `count` batches arrived; false on time-out.
+    bool WaitForBatches(size_t count, std::chrono::milliseconds timeout);
     // How many events had arrived when each flush completion came, in order.
     std::vector<size_t> Flushes();
     // Waits until at least `count` flush completions arrived; false on time-out.

@@ -36,6 +36,8 @@ class VYRServiceTestPeer {
     // Makes `pid` the only process that uses `handle`, as if that process had opened it and
     // made every call on it: its end releases the handle.
     static void SetOnlyClientProcess(VYRService& service, int32_t handle, pid_t pid);
+    // Whether `handle` has taken the sample that the block holds now.
+    static bool HasTakenSample(VYRService& service, size_t index, int32_t handle);
     // What a death notice for the callback binder `binder` does.
     static void DeliverBinderDeath(VYRService& service, AIBinder* binder);
 };
