@@ -58,7 +58,7 @@ struct ClientEntry {
     int32_t max_report_latency = 0;
     std::shared_ptr<aidl::android::vyr::IEventCallback> callback;
     // The callback's interface version, asked by the first EnableOnSample after SetCallback (0:
-    // not asked yet); a version 1 callback gets no version 2 method.
+    // not asked yet); only a callback known to be of version 2 gets version 2's methods.
     int32_t callback_version = 0;
     // kClientEnabled or kClientDisabled; the notification thread polls it without a lock.
     std::atomic<int32_t> state{kClientDisabled};

@@ -297,6 +297,7 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
 
 ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
                                               int32_t max_report_latency, int32_t* result) {
+    LearnCallbackVersion(handle);
     LOCK_API();
     auto it = clients_.find(handle);
     if (it == clients_.end()) {
@@ -315,9 +316,9 @@ ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
         *result = -EINVAL;
         return Ok();
     }
-    if (max_report_latency > 0 && CallbackVersion(&entry) < 2) {
+    if (max_report_latency > 0 && CallbackVersion(entry) < 2) {
         ALOGE("%s handle %d: a version %d callback cannot take batches", __func__, handle,
-              entry.callback_version);
+              CallbackVersion(entry));
         *result = -EOPNOTSUPP;
         return Ok();
     }
@@ -331,14 +332,31 @@ ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
     return Ok();
 }
 
-int32_t VYRService::CallbackVersion(ClientEntry* entry) {
-    if (entry->callback_version == 0) {
-        int32_t version = 0;
-        // A callback that cannot say (built before versions were reported) is of version 1.
-        if (!entry->callback->getInterfaceVersion(&version).isOk() || version < 1) version = 1;
-        entry->callback_version = version;
+void VYRService::LearnCallbackVersion(int32_t handle) {
+    std::shared_ptr<IEventCallback> callback;
+    {
+        LOCK_API();
+        auto it = clients_.find(handle);
+        if (it == clients_.end() || !it->second->callback || it->second->callback_version != 0) {
+            return;
+        }
+        callback = it->second->callback;
     }
-    return entry->callback_version;
+    // Asked without the API lock: a client slow to answer holds up its own call only.
+    int32_t version = 0;
+    // A callback that cannot say (built before versions were reported) is of version 1.
+    if (!callback->getInterfaceVersion(&version).isOk() || version < 1) version = 1;
+    LOCK_API();
+    auto it = clients_.find(handle);
+    // A callback set meanwhile is asked by the next EnableOnSample.
+    if (it != clients_.end() && it->second->callback == callback) {
+        it->second->callback_version = version;
+    }
+}
+
+int32_t VYRService::CallbackVersion(const ClientEntry& entry) {
+    // Not known yet (replaced while being asked): none of version 2's methods for it.
+    return std::max(entry.callback_version, 1);
 }
 
 void VYRService::StartClient(int32_t handle, const std::shared_ptr<ClientEntry>& entry) {
@@ -363,9 +381,9 @@ ndk::ScopedAStatus VYRService::Flush(int32_t handle, int32_t* result) {
         *result = -EINVAL;
         return Ok();
     }
-    if (CallbackVersion(&entry) < 2) {
+    if (CallbackVersion(entry) < 2) {
         ALOGE("%s handle %d: a version %d callback cannot be told of a flush", __func__, handle,
-              entry.callback_version);
+              CallbackVersion(entry));
         *result = -EOPNOTSUPP;
         return Ok();
     }

@@ -132,8 +132,11 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // What Enable and EnableOnSample share once the entry is set up: the delivery thread, the
     // work item and the dump's record.
     void StartClient(int32_t handle, const std::shared_ptr<ClientEntry>& entry) REQUIRES(api_lock_);
-    // The callback's interface version, asked once per callback.
-    static int32_t CallbackVersion(ClientEntry* entry);
+    // Asks the callback of `handle` for its interface version, once per callback, and keeps the
+    // answer in its entry.
+    void LearnCallbackVersion(int32_t handle) EXCLUDES(api_lock_);
+    // What LearnCallbackVersion learnt; 1 while nothing is known.
+    static int32_t CallbackVersion(const ClientEntry& entry);
 
     // A death link's cookie and recipient. The runtime reports when no notice can come any more
     // (the link was removed, or its notice delivered); the link is freed after that, never
