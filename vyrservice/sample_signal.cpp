@@ -38,6 +38,8 @@ bool SampleSignal::ChangedLocked(const Seen& seen) const {
 SampleSignal::Seen SampleSignal::Wait(const Seen& seen,
                                       std::optional<std::chrono::steady_clock::time_point> deadline) {
     std::unique_lock<std::mutex> lock(mutex_);
+    // The analysis cannot follow unique_lock.
+    android::base::ScopedLockAssertion locked(mutex_);
     while (!ChangedLocked(seen)) {
         if (!deadline) {
             changed_.wait(lock);
