@@ -10,4 +10,13 @@ ndk::ScopedAStatus EventSink::OnEvent(const aidl::android::vyr::Event& event) {
     return ndk::ScopedAStatus::ok();
 }
 
+ndk::ScopedAStatus EventSink::OnEventBatch(const std::vector<aidl::android::vyr::Event>& events) {
+    for (const auto& event : events) sink_(event);
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus EventSink::OnFlushComplete(int32_t) {
+    return ndk::ScopedAStatus::ok();
+}
+
 }  // namespace vyr

@@ -147,7 +147,7 @@ SensorClient::Core::Attempt SensorClient::Core::Attach(const std::shared_ptr<IVY
         }
         if (result != 0) listener_->OnSettingRefused("control values", result);
     }
-    if (!service->Enable(handle, settings_.period_ms, &result).isOk()) return {Attempt::kDied};
+    if (!EnableHandle(*service, handle, &result).isOk()) return {Attempt::kDied};
     if (result != 0) return {Attempt::kFailed, result, "enable"};
     std::lock_guard<std::mutex> lock(mutex_);
     enabled_ = true;
@@ -271,6 +271,20 @@ bool SensorClient::Core::Reattach(int32_t old_handle, const ndk::SpAIBinder& dea
     }
     if (attached) listener_->OnResumed(old_handle, new_handle, since_last_event);
     return attached;
+}
+
+ndk::ScopedAStatus SensorClient::Core::EnableHandle(IVYRService& service, int32_t handle,
+                                                    int32_t* result) {
+    if (settings_.use_callback && settings_.max_interface_version >= 2) {
+        int32_t version = 1;
+        // A service that cannot say is of version 1; a dead one fails the Enable below as well.
+        if (!service.getInterfaceVersion(&version).isOk()) version = 1;
+        if (version >= 2) {
+            return service.EnableOnSample(handle, settings_.period_ms, /*maxReportLatency=*/0,
+                                          result);
+        }
+    }
+    return service.Enable(handle, settings_.period_ms, result);
 }
 
 void SensorClient::Core::GiveUp(const std::string& reason) {

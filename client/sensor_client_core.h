@@ -61,6 +61,9 @@ class SensorClient::Core : public std::enable_shared_from_this<SensorClient::Cor
     void Supervise() EXCLUDES(mutex_);
     // Attaches to the next instance that registers; false if the client gave up or stops.
     bool Reattach(int32_t old_handle, const ndk::SpAIBinder& dead) EXCLUDES(mutex_);
+    // Enable, or EnableOnSample when the settings and the service allow it.
+    ndk::ScopedAStatus EnableHandle(aidl::android::vyr::IVYRService& service, int32_t handle,
+                                    int32_t* result);
     void GiveUp(const std::string& reason) EXCLUDES(mutex_);
     void Deliver(const aidl::android::vyr::Event& event) EXCLUDES(mutex_);
 

@@ -14,6 +14,7 @@ ClientEntry::~ClientEntry() {
 
 void ClientEntry::StopNotify() {
     state = kClientDisabled;
+    if (sample_signal) sample_signal->Stop();
     if (notify_cv) {
         // Taking the mutex once orders the state change before any wait that has not yet begun,
         // so the notification cannot fall between the thread's test of `state` and its wait.
@@ -34,6 +35,7 @@ void ClientEntry::Disable() {
     notify_thread.reset();
     notify_cv.reset();
     notify_mutex.reset();
+    sample_signal.reset();
 }
 
 }  // namespace binder

@@ -18,6 +18,7 @@
 #include <utility>
 
 #include "client_process_watcher.h"
+#include "sample_signal.h"
 
 namespace android {
 namespace vyr {
@@ -54,7 +55,14 @@ struct ClientEntry {
 
     const int32_t mode;
     int32_t period = 0;
+    // Set by EnableOnSample (version 2): delivery on each stored sample instead of a timer, and
+    // the longest that samples may be held to be handed over together (0: none are held).
+    bool on_sample = false;
+    int32_t max_report_latency = 0;
     std::shared_ptr<aidl::android::vyr::IEventCallback> callback;
+    // The callback's interface version, asked by the first EnableOnSample after SetCallback (0:
+    // not asked yet); only a callback known to be of version 2 gets version 2's methods.
+    int32_t callback_version = 0;
     // kClientEnabled or kClientDisabled; the notification thread polls it without a lock.
     std::atomic<int32_t> state{kClientDisabled};
     std::unique_ptr<std::thread> notify_thread;
@@ -63,6 +71,8 @@ struct ClientEntry {
     std::atomic<uint64_t> notify_generation{0};
     std::unique_ptr<std::condition_variable> notify_cv;
     std::unique_ptr<std::mutex> notify_mutex;
+    // Wakes the thread of a client enabled on sample with a callback; null otherwise.
+    std::shared_ptr<SampleSignal> sample_signal;
     // Held strongly: an in-process callback keeps only a weak reference to its own binder.
     ndk::SpAIBinder callback_binder;
     AIBinder_DeathRecipient* death_recipient = nullptr;

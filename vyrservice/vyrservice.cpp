@@ -15,6 +15,7 @@
 #include <fcntl.h>
 #include <log/log.h>
 #include <poll.h>
+#include <time.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -62,6 +63,12 @@ int64_t MillisSince(std::chrono::steady_clock::time_point start) {
     return std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() -
                                                                  start)
         .count();
+}
+
+int64_t BootTimeNs() {
+    timespec now{};
+    clock_gettime(CLOCK_BOOTTIME, &now);
+    return int64_t{now.tv_sec} * 1000000000 + now.tv_nsec;
 }
 
 // Absolute system-clock time `left` from now, saturated at the clock's largest time point.
@@ -280,19 +287,107 @@ ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* r
         return Ok();
     }
     ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
-    const int32_t effective_period = period >= 1 ? period : kDefaultPeriodMs;
-    entry.state = kClientEnabled;
-    entry.period = effective_period;
-    entry.notify_cv = std::make_unique<std::condition_variable>();
-    entry.notify_mutex = std::make_unique<std::mutex>();
-    const uint64_t generation = ++entry.notify_generation;
-    if (entry.callback) {
-        entry.notify_thread = std::make_unique<std::thread>(&VYRService::NotifyLoop, this, handle,
-                                                            it->second, generation);
+    entry.period = period >= 1 ? period : kDefaultPeriodMs;
+    entry.on_sample = false;
+    entry.max_report_latency = 0;
+    StartClient(handle, it->second);
+    *result = 0;
+    return Ok();
+}
+
+ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
+                                              int32_t max_report_latency, int32_t* result) {
+    LearnCallbackVersion(handle);
+    LOCK_API();
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGE("%s invalid handle %d", __func__, handle);
+        *result = -ENOSYS;
+        return Ok();
     }
-    QueueForMode(entry.mode).PushAndSignal(WorkItem{true, entry.mode, handle, effective_period});
+    ClientEntry& entry = *it->second;
+    NoteCaller(&entry);
+    if (entry.state == kClientEnabled) {
+        *result = -EEXIST;
+        return Ok();
+    }
+    if (max_report_latency < 0 || (max_report_latency > 0 && !entry.callback)) {
+        ALOGE("%s handle %d: invalid max report latency %d", __func__, handle, max_report_latency);
+        *result = -EINVAL;
+        return Ok();
+    }
+    if (max_report_latency > 0 && CallbackVersion(entry) < 2) {
+        ALOGE("%s handle %d: a version %d callback cannot take batches", __func__, handle,
+              CallbackVersion(entry));
+        *result = -EOPNOTSUPP;
+        return Ok();
+    }
+    ALOGI("%s handle %d, mode %d, max report latency %d", __func__, handle, entry.mode,
+          max_report_latency);
+    entry.period = period >= 1 ? period : kDefaultPeriodMs;
+    entry.on_sample = true;
+    entry.max_report_latency = max_report_latency;
+    StartClient(handle, it->second);
+    *result = 0;
+    return Ok();
+}
+
+void VYRService::LearnCallbackVersion(int32_t handle) {
+    std::shared_ptr<IEventCallback> callback;
+    {
+        LOCK_API();
+        auto it = clients_.find(handle);
+        if (it == clients_.end() || !it->second->callback || it->second->callback_version != 0) {
+            return;
+        }
+        callback = it->second->callback;
+    }
+    // Asked without the API lock: a client slow to answer holds up its own call only.
+    int32_t version = 0;
+    // A callback that cannot say (built before versions were reported) is of version 1.
+    if (!callback->getInterfaceVersion(&version).isOk() || version < 1) version = 1;
+    LOCK_API();
+    auto it = clients_.find(handle);
+    // A callback set meanwhile is asked by the next EnableOnSample.
+    if (it != clients_.end() && it->second->callback == callback) {
+        it->second->callback_version = version;
+    }
+}
+
+int32_t VYRService::CallbackVersion(const ClientEntry& entry) {
+    // Not known yet (replaced while being asked): none of version 2's methods for it.
+    return std::max(entry.callback_version, 1);
+}
+
+void VYRService::StartClient(int32_t handle, const std::shared_ptr<ClientEntry>& entry) {
+    delivery_.Start(handle, entry);
+    QueueForMode(entry->mode).PushAndSignal(WorkItem{true, entry->mode, handle, entry->period});
     RecordEvent("enable handle " + std::to_string(handle) + " period " +
-                std::to_string(effective_period));
+                std::to_string(entry->period));
+}
+
+ndk::ScopedAStatus VYRService::Flush(int32_t handle, int32_t* result) {
+    LOCK_API();
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        ALOGE("%s invalid handle %d", __func__, handle);
+        *result = -ENOSYS;
+        return Ok();
+    }
+    ClientEntry& entry = *it->second;
+    NoteCaller(&entry);
+    if (entry.state != kClientEnabled || !entry.sample_signal) {
+        ALOGE("%s handle %d is not enabled on sample with a callback", __func__, handle);
+        *result = -EINVAL;
+        return Ok();
+    }
+    if (CallbackVersion(entry) < 2) {
+        ALOGE("%s handle %d: a version %d callback cannot be told of a flush", __func__, handle,
+              CallbackVersion(entry));
+        *result = -EOPNOTSUPP;
+        return Ok();
+    }
+    entry.sample_signal->Flush();
     *result = 0;
     return Ok();
 }
@@ -375,6 +470,7 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
     // and the client is still disabled and closed once when its process dies.
     UnlinkDeath(&entry);
     entry.callback = callback;
+    entry.callback_version = 0;
     entry.callback_binder = entry.callback->asBinder();
 
     auto owned = std::make_unique<DeathLink>(entry.callback_binder.get(), this);
@@ -685,18 +781,22 @@ void VYRService::ProcessLoop(ServiceModeParams* params) {
                 ATRACE_BEGIN("vyr range read");
                 range_sensor_->Process(kRangeProcessMode, &data);
             }
+            // As the library returns the reading: the time a camera frame can be matched to.
+            const int64_t boottime_ns = BootTimeNs();
             ATRACE_END();
             // A reading taken across a disable is stale for whoever enables next.
             if (!params->running) {
                 return;
             }
             std::lock_guard<std::mutex> lock(params->data_mutex);
+            params->boottime_ns = boottime_ns;
             if (mode == kAlsMode) {
                 params->als_data = reading;
             } else {
                 params->range_data = data;
             }
             params->polled_handles.clear();
+            EventDelivery::SampleStored(params->sample_signals);
             ++params->samples;
             if ((mode == kAlsMode ? reading.valid : data.valid) == 0) ++params->invalid_samples;
             params->last_sample_ns = std::chrono::duration_cast<std::chrono::nanoseconds>(
@@ -799,53 +899,6 @@ void VYRService::MonitorDisplayStatus(const std::string& path) {
 
 // Data path.
 
-bool VYRService::PollInternal(int32_t handle, int32_t mode, Event* event) {
-    Event local{};
-    if (mode != kRangeMode && mode != kAlsMode) {
-        ALOGE("%s, invalid mode", __func__);
-        return false;
-    }
-    ServiceModeParams* params = &ParamsForMode(mode);
-    {
-        std::lock_guard<std::mutex> lock(params->data_mutex);
-        if (params->polled_handles.count(handle) != 0) {
-            return false;
-        }
-    }
-    // A sample published between the test above and this section is the one taken.
-    ALSResult als_data{};
-    MultiRangingData range_data{};
-    {
-        std::lock_guard<std::mutex> lock(params->data_mutex);
-        params->polled_handles.insert(handle);
-        if (mode == kRangeMode) {
-            range_data = params->range_data;
-        } else {
-            als_data = params->als_data;
-        }
-    }
-    // Converted outside the lock so that the processing loop waits for one copy at most.
-    if (mode == kRangeMode) {
-        if (range_data.valid == 0) {
-            ALOGW("%s, invalid data", __func__);
-            return false;
-        }
-        ConvertRangingData(range_data, &local);
-    } else {
-        if (als_data.valid == 0) {
-            ALOGW("%s, invalid data", __func__);
-            return false;
-        }
-        ConvertAlsResult(als_data, &local);
-    }
-    event->status = local.status;
-    event->timestamp = local.timestamp;
-    event->value0 = local.value0;
-    event->value1 = local.value1;
-    event->data = std::move(local.data);
-    return true;
-}
-
 ndk::ScopedAStatus VYRService::PollOnce(int32_t handle, Event* event, int32_t* result) {
     LOCK_API();
     auto it = clients_.find(handle);
@@ -855,51 +908,9 @@ ndk::ScopedAStatus VYRService::PollOnce(int32_t handle, Event* event, int32_t* r
         return Ok();
     }
     NoteCaller(it->second.get());
-    *result = PollInternal(handle, it->second->mode, event) ? 0 : -ENODATA;
+    *result = delivery_.PollInternal(handle, it->second->mode, event) ? 0 : -ENODATA;
     if (*result != 0) ++it->second->polls_refused;
     return Ok();
-}
-
-void VYRService::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
-                            uint64_t generation) {
-    if (entry == nullptr) {
-        return;
-    }
-    // False once the client was disabled, also when a nested Enable has started a successor.
-    const auto enabled = [&entry, generation] {
-        return entry->state == kClientEnabled && entry->notify_generation == generation;
-    };
-    Event event{};
-    while (enabled() && entry->callback) {
-        const bool ok = PollInternal(handle, entry->mode, &event);
-        if (!enabled()) {
-            break;
-        }
-        if (ok) {
-            // Its own reference: OnEvent may call SetCallback or Close, which drop the entry's.
-            const std::shared_ptr<IEventCallback> callback = entry->callback;
-            // A failed delivery is the death handler's business, not this loop's.
-            ATRACE_BEGIN("vyr deliver");
-            callback->OnEvent(event);
-            ATRACE_END();
-            ++entry->events_delivered;
-            if (!enabled()) {
-                break;
-            }
-        }
-        const auto deadline = std::chrono::steady_clock::now() +
-                              std::chrono::nanoseconds(int64_t{entry->period} * 1000000);
-        std::unique_lock<std::mutex> lock(*entry->notify_mutex);
-        while (enabled()) {
-            const auto left = deadline - std::chrono::steady_clock::now();
-            if (left >= std::chrono::nanoseconds(1)) {
-                entry->notify_cv->wait_for(lock, left);
-            }
-            if (std::chrono::steady_clock::now() >= deadline) {
-                break;
-            }
-        }
-    }
 }
 
 // Process entry.

@@ -26,6 +26,7 @@
 #include "client_entry.h"
 #include "client_process_watcher.h"
 #include "dump_value.h"
+#include "event_delivery.h"
 #include "event_ring.h"
 #include "service_config.h"
 #include "service_mode_params.h"
@@ -59,6 +60,9 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     ndk::ScopedAStatus ConfigureParameters(int32_t handle, const std::vector<int32_t>& params,
                                            int32_t* result) override;
     ndk::ScopedAStatus SetTorchLightState(int32_t state) override;
+    ndk::ScopedAStatus EnableOnSample(int32_t handle, int32_t period, int32_t max_report_latency,
+                                      int32_t* result) override;
+    ndk::ScopedAStatus Flush(int32_t handle, int32_t* result) override;
 
     // `dumpsys vyrservice`: sensors, mode blocks, clients, queues, display, APEX and recent
     // events, as text or (argument "--json") one JSON object. Waits at most 1 s for any lock and
@@ -128,9 +132,14 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     DumpValue DumpDisplay() const;
     DumpValue DumpEvents() const;
 
-    bool PollInternal(int32_t handle, int32_t mode, aidl::android::vyr::Event* event);
-    // Holds the entry: a nested Close from OnEvent leaves it valid until the loop has ended.
-    void NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry, uint64_t generation);
+    // What Enable and EnableOnSample share once the entry is set up: the delivery thread, the
+    // work item and the dump's record.
+    void StartClient(int32_t handle, const std::shared_ptr<ClientEntry>& entry) REQUIRES(api_lock_);
+    // Asks the callback of `handle` for its interface version, once per callback, and keeps the
+    // answer in its entry.
+    void LearnCallbackVersion(int32_t handle) EXCLUDES(api_lock_);
+    // What LearnCallbackVersion learnt; 1 while nothing is known.
+    static int32_t CallbackVersion(const ClientEntry& entry);
 
     // A death link's cookie and recipient. The runtime reports when no notice can come any more
     // (the link was removed, or its notice delivered); the link is freed after that, never
@@ -190,6 +199,9 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     mutable std::mutex apex_mutex_;
     std::function<DumpValue()> apex_section_ GUARDED_BY(apex_mutex_);
     EventRing events_;
+    // Polls, the version 1 notification loops and the version 2 delivery on sample.
+    EventDelivery delivery_{
+        [this](int32_t mode) -> ServiceModeParams& { return ParamsForMode(mode); }};
 };
 
 // Builds the production service and registers it as "vyrservice".

@@ -21,6 +21,10 @@ using aidl::android::vyr::IVYRService;
 class IgnoringCallback : public aidl::android::vyr::BnEventCallback {
   public:
     ndk::ScopedAStatus OnEvent(const Event&) override { return ndk::ScopedAStatus::ok(); }
+    ndk::ScopedAStatus OnEventBatch(const std::vector<Event>&) override {
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus OnFlushComplete(int32_t) override { return ndk::ScopedAStatus::ok(); }
 };
 
 void Reached(const char* step) {

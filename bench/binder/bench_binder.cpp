@@ -76,6 +76,10 @@ class BenchService : public BnVYRService {
         return Set(r, 0);
     }
     ndk::ScopedAStatus SetTorchLightState(int32_t) override { return ndk::ScopedAStatus::ok(); }
+    ndk::ScopedAStatus EnableOnSample(int32_t handle, int32_t period, int32_t, int32_t* r) override {
+        return Set(r, handle + period);
+    }
+    ndk::ScopedAStatus Flush(int32_t, int32_t* r) override { return Set(r, 0); }
 
   private:
     static ndk::ScopedAStatus Set(int32_t* r, int32_t value) {

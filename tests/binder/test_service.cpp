@@ -110,6 +110,17 @@ ndk::ScopedAStatus TestService::SetTorchLightState(int32_t state) {
     return ndk::ScopedAStatus::ok();
 }
 
+// The round trips use version 1's methods only.
+ndk::ScopedAStatus TestService::EnableOnSample(int32_t, int32_t, int32_t, int32_t* result) {
+    *result = -ENOSYS;
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus TestService::Flush(int32_t, int32_t* result) {
+    *result = -ENOSYS;
+    return ndk::ScopedAStatus::ok();
+}
+
 std::shared_ptr<IEventCallback> TestService::callback() {
     std::lock_guard<std::mutex> lock(mutex_);
     return callback_;
@@ -119,6 +130,17 @@ ndk::ScopedAStatus RecordingCallback::OnEvent(const Event& event) {
     std::lock_guard<std::mutex> lock(mutex_);
     events_.push_back(event);
     cv_.notify_all();
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus RecordingCallback::OnEventBatch(const std::vector<Event>& events) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    events_.insert(events_.end(), events.begin(), events.end());
+    cv_.notify_all();
+    return ndk::ScopedAStatus::ok();
+}
+
+ndk::ScopedAStatus RecordingCallback::OnFlushComplete(int32_t) {
     return ndk::ScopedAStatus::ok();
 }
 

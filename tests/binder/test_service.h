@@ -48,6 +48,9 @@ class TestService : public BnVYRService {
     ndk::ScopedAStatus ConfigureParameters(int32_t handle, const std::vector<int32_t>& params,
                                            int32_t* result) override;
     ndk::ScopedAStatus SetTorchLightState(int32_t state) override;
+    ndk::ScopedAStatus EnableOnSample(int32_t handle, int32_t period, int32_t max_report_latency,
+                                      int32_t* result) override;
+    ndk::ScopedAStatus Flush(int32_t handle, int32_t* result) override;
     binder_status_t dump(int fd, const char** args, uint32_t num_args) override;
 
     std::shared_ptr<IEventCallback> callback();
@@ -65,6 +68,8 @@ class TestService : public BnVYRService {
 class RecordingCallback : public BnEventCallback {
   public:
     ndk::ScopedAStatus OnEvent(const Event& event) override;
+    ndk::ScopedAStatus OnEventBatch(const std::vector<Event>& events) override;
+    ndk::ScopedAStatus OnFlushComplete(int32_t handle) override;
     // Waits up to 10 s for `count` events.
     bool WaitForEvents(size_t count);
     std::vector<Event> events();

@@ -5,6 +5,9 @@
 // milliseconds (the real one takes 4 s to register). It prints one line per call on stdout:
 //   "<Method> <arguments> -> <result>"
 // and pushes an event to a client with a callback every period while it is enabled.
+// Built twice: vyr_fake_service of today's interface, where EnableOnSample enables as Enable
+// does, and vyr_fake_service_v1 from the frozen version 1 (VYR_FAKE_SERVICE_V1), which knows
+// only version 1's methods and Event.
 //
 //   vyr_fake_service [--first-handle H] [--refuse N] [--absent]
 //     --first-handle H  handles are H, H+1, ... (default 1)
@@ -50,12 +53,16 @@ class Pusher {
                   }
                   Event event{};
                   event.timestamp = n;
+#ifndef VYR_FAKE_SERVICE_V1
+                  event.boottime = n * 1000000;
+#endif
                   event.value0 = static_cast<float>(handle);
                   lock.unlock();
                   callback->OnEvent(event);
                   lock.lock();
               }
-          }) {}
+          }) {
+    }
     ~Pusher() {
         {
             std::lock_guard<std::mutex> lock(mutex_);
@@ -124,6 +131,25 @@ class FakeService : public aidl::android::vyr::BnVYRService {
         Say("SetCallback " + std::to_string(handle) + " -> " + std::to_string(*result));
         return ndk::ScopedAStatus::ok();
     }
+#ifndef VYR_FAKE_SERVICE_V1
+    ndk::ScopedAStatus EnableOnSample(int32_t handle, int32_t period, int32_t latency,
+                                      int32_t* result) override {
+        std::lock_guard<std::mutex> lock(mutex_);
+        auto it = clients_.find(handle);
+        *result = it == clients_.end() ? -38 : 0;
+        if (it != clients_.end() && it->second.callback) {
+            it->second.pusher = std::make_unique<Pusher>(it->second.callback, handle, period);
+        }
+        Say("EnableOnSample " + std::to_string(handle) + " " + std::to_string(period) + " " +
+            std::to_string(latency) + " -> " + std::to_string(*result));
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus Flush(int32_t handle, int32_t* result) override {
+        *result = 0;
+        Say("Flush " + std::to_string(handle) + " -> 0");
+        return ndk::ScopedAStatus::ok();
+    }
+#endif
     ndk::ScopedAStatus EnableLowPower(int32_t handle, bool enable, int32_t* result) override {
         // As the service does for range handles.
         *result = -22;

@@ -116,9 +116,11 @@ class SensorClientTest : public ::testing::Test {
         ABinderProcess_startThreadPool();
     }
 
-    // Starts the stand-in service and waits until it is registered.
-    std::unique_ptr<ChildProcess> StartFake(std::vector<std::string> args = {}) {
-        args.insert(args.begin(), FAKE_SERVICE_PATH);
+    // Starts the stand-in service and waits until it is registered: by default one of interface
+    // version 1, to which the client enables every handle the version 1 way.
+    std::unique_ptr<ChildProcess> StartFake(std::vector<std::string> args = {},
+                                            const char* binary = FAKE_SERVICE_PATH) {
+        args.insert(args.begin(), binary);
         auto fake = std::make_unique<ChildProcess>(
             args, std::map<std::string, std::string>{{"VYR_BINDER_DIR", registry_}},
             dir_.Path("fake-" + std::to_string(++fakes_) + ".log"));
@@ -186,6 +188,48 @@ TEST_F(SensorClientTest, AttachesWithEverySettingAndReceivesEvents) {
     ExpectCalls(fake.get(), {"Disable 7", "Close 7"});
     EXPECT_EQ(client.state(), SensorClient::State::kStopped);
     EXPECT_FALSE(ClientThreadLeft()) << vyr_test::ThreadNames();
+}
+
+TEST_F(SensorClientTest, OnAVersion2ServiceACallbackClientIsEnabledOnSample) {
+    auto fake = StartFake({"--first-handle", "7"}, FAKE_SERVICE_V2_PATH);
+    SensorClient client(RangeSettings(), &recorder_, QuickPolicy());
+    ASSERT_EQ(client.Start(Service()), 0);
+    std::vector<std::string> calls = AttachCalls(7);
+    calls.back() = "EnableOnSample 7 20 0 -> 0";
+    ExpectCalls(fake.get(), calls);
+    ASSERT_TRUE(recorder_.WaitForEvents(1));
+    {
+        std::lock_guard<std::mutex> lock(recorder_.mutex_);
+        EXPECT_EQ(recorder_.events_[0].boottime, recorder_.events_[0].timestamp * 1000000)
+            << "the reading's boot time reaches the listener";
+    }
+    client.Stop();
+    ExpectCalls(fake.get(), {"Disable 7", "Close 7"});
+}
+
+TEST_F(SensorClientTest, InterfaceVersion1IsKeptWhenAsked) {
+    auto fake = StartFake({"--first-handle", "7"}, FAKE_SERVICE_V2_PATH);
+    vyr::SensorSettings settings = RangeSettings();
+    settings.max_interface_version = 1;
+    SensorClient client(settings, &recorder_, QuickPolicy());
+    ASSERT_EQ(client.Start(Service()), 0);
+    ExpectCalls(fake.get(), AttachCalls(7));
+    EXPECT_TRUE(recorder_.WaitForEvents(1));
+    client.Stop();
+    ExpectCalls(fake.get(), {"Disable 7", "Close 7"});
+}
+
+TEST_F(SensorClientTest, PollingClientIsEnabledTheVersion1WayOnAVersion2Service) {
+    auto fake = StartFake({"--first-handle", "7"}, FAKE_SERVICE_V2_PATH);
+    vyr::SensorSettings settings = RangeSettings();
+    settings.use_callback = false;
+    settings.low_power.reset();
+    settings.control_values.clear();
+    SensorClient client(settings, &recorder_, QuickPolicy());
+    ASSERT_EQ(client.Start(Service()), 0);
+    ExpectCalls(fake.get(), {"Open 3 -> 7", "Enable 7 20 -> 0"});
+    client.Stop();
+    ExpectCalls(fake.get(), {"Disable 7", "Close 7"});
 }
 
 TEST_F(SensorClientTest, ReattachesAfterARestartWithEverySetting) {

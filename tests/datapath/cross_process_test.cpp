@@ -182,6 +182,47 @@ TEST_F(CrossProcessTest, CallbackClientReceivesEventsAtItsPeriod) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
+// The stream's lines with the reading's boot time and the boot time at which OnEvent ran.
+std::vector<std::string> StreamLines(ChildProcess* stream) {
+    std::vector<std::string> lines;
+    while (std::optional<std::string> line = stream->ReadLine(kWait)) lines.push_back(*line);
+    return lines;
+}
+
+TEST_F(CrossProcessTest, CallbackStreamIsEnabledOnSampleAndStampsEachEvent) {
+    auto stream = Vyrctl({"--timeout", "10", "stream", "range", "--callback", "--period", "33",
+                          "--count", "6", "--json"});
+    const std::vector<std::string> lines = StreamLines(stream.get());
+    EXPECT_TRUE(ExitedWith(stream->Wait(kWait), 0));
+    ASSERT_EQ(lines.size(), 6u);
+    const int32_t handle = static_cast<int32_t>(JsonInt(lines[0], "handle"));
+    EXPECT_EQ(process_->LogCount("EnableOnSample handle " + std::to_string(handle) +
+                                 ", mode 3, max report latency 0"),
+              1u);
+    int64_t previous_frame = INT64_MIN;
+    for (const std::string& line : lines) {
+        const int64_t read = JsonInt(line, "boottime_ns");
+        const int64_t received = JsonInt(line, "received_boottime_ns");
+        EXPECT_GT(read, 0) << line;
+        EXPECT_GE(received, read) << "received before it was read: " << line;
+        const int64_t frame = JsonInt(line, "frame_number");
+        EXPECT_GT(frame, previous_frame) << "a sample delivered twice: " << line;
+        previous_frame = frame;
+    }
+}
+
+TEST_F(CrossProcessTest, InterfaceOneStreamIsEnabledTheVersion1Way) {
+    auto stream = Vyrctl({"--timeout", "10", "stream", "range", "--callback", "--period", "50",
+                          "--count", "2", "--json", "--interface", "1"});
+    const std::vector<std::string> lines = StreamLines(stream.get());
+    EXPECT_TRUE(ExitedWith(stream->Wait(kWait), 0));
+    ASSERT_EQ(lines.size(), 2u);
+    const std::string handle = std::to_string(JsonInt(lines[0], "handle"));
+    EXPECT_EQ(process_->LogCount("Enable handle " + handle + ", mode 3"), 1u);
+    EXPECT_EQ(process_->LogCount("EnableOnSample handle " + handle), 0u);
+    EXPECT_GT(JsonInt(lines[0], "boottime_ns"), 0) << "the service stamps every event";
+}
+
 TEST_F(CrossProcessTest, InterruptedStreamDisablesAndClosesItsHandle) {
     auto stream = Vyrctl({"stream", "range", "--poll", "--period", "100", "--json"});
     std::optional<std::string> first = stream->ReadLine(kWait);

@@ -47,6 +47,10 @@ class BlockingCallback : public aidl::android::vyr::BnEventCallback {
         changed_.wait(lock, [this] { return released_; });
         return ndk::ScopedAStatus::ok();
     }
+    ndk::ScopedAStatus OnEventBatch(const std::vector<Event>&) override {
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus OnFlushComplete(int32_t) override { return ndk::ScopedAStatus::ok(); }
     bool WaitForEvent() {
         std::unique_lock<std::mutex> lock(mutex_);
         return changed_.wait_for(lock, kWait, [this] { return !events_.empty(); });

@@ -68,13 +68,13 @@ ALSResult LightRecord(int64_t timestamp_ns) {
 std::string RangeLine(const MultiRangingData& data) {
     Event event;
     android::vyr::binder::ConvertRangingData(data, &event);
-    return vyrctl::FormatEventJson(vyrctl::kModeRange, 77, event);
+    return vyrctl::FormatEventJson(vyrctl::kModeRange, 77, event, 0);
 }
 
 std::string LightLine(const ALSResult& result) {
     Event event;
     android::vyr::binder::ConvertAlsResult(result, &event);
-    return vyrctl::FormatEventJson(vyrctl::kModeAls, 77, event);
+    return vyrctl::FormatEventJson(vyrctl::kModeAls, 77, event, 0);
 }
 
 class RecordingTest : public ::testing::Test {

@@ -272,6 +272,10 @@ TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
 class IgnoringCallback : public aidl::android::vyr::BnEventCallback {
   public:
     ndk::ScopedAStatus OnEvent(const Event&) override { return ndk::ScopedAStatus::ok(); }
+    ndk::ScopedAStatus OnEventBatch(const std::vector<Event>&) override {
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus OnFlushComplete(int32_t) override { return ndk::ScopedAStatus::ok(); }
 };
 
 int RunCallbackClient() {

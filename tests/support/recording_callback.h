@@ -19,11 +19,21 @@ namespace vyr_test {
 class RecordingCallback : public aidl::android::vyr::BnEventCallback {
   public:
     ndk::ScopedAStatus OnEvent(const aidl::android::vyr::Event& event) override;
+    // The batch's events join the others in order; the batch's size is kept too.
+    ndk::ScopedAStatus OnEventBatch(const std::vector<aidl::android::vyr::Event>& events) override;
+    ndk::ScopedAStatus OnFlushComplete(int32_t handle) override;
 
     std::vector<aidl::android::vyr::Event> Events();
     size_t Count();
     // Waits until at least `count` events arrived; false on time-out.
     bool WaitForEvents(size_t count, std::chrono::milliseconds timeout);
+    std::vector<size_t> BatchSizes();
+    // Waits until at least `count` batches arrived; false on time-out.
+    bool WaitForBatches(size_t count, std::chrono::milliseconds timeout);
+    // How many events had arrived when each flush completion came, in order.
+    std::vector<size_t> Flushes();
+    // Waits until at least `count` flush completions arrived; false on time-out.
+    bool WaitForFlushes(size_t count, std::chrono::milliseconds timeout);
     // While set, OnEvent records the event and then returns an error status.
     void SetFailing(bool failing) { failing_.store(failing); }
     // Runs inside OnEvent, on the caller's thread, after the event is recorded, with the number
@@ -34,6 +44,8 @@ class RecordingCallback : public aidl::android::vyr::BnEventCallback {
     std::mutex mutex_;
     std::condition_variable changed_;
     std::vector<aidl::android::vyr::Event> events_;
+    std::vector<size_t> batch_sizes_;
+    std::vector<size_t> flushes_;
     std::atomic<bool> failing_{false};
     std::function<void(size_t)> reaction_;
 };

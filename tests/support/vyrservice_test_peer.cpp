@@ -35,6 +35,17 @@ void VYRServiceTestPeer::SetOnlyClientProcess(VYRService& service, int32_t handl
     service.NoteProcess(&entry, pid);
 }
 
+std::shared_ptr<ClientEntry> VYRServiceTestPeer::Entry(VYRService& service, int32_t handle) {
+    ApiLockGuard lock(service.api_lock_, std::chrono::seconds(10));
+    return service.clients_.at(handle);
+}
+
+bool VYRServiceTestPeer::HasTakenSample(VYRService& service, size_t index, int32_t handle) {
+    ServiceModeParams& params = service.mode_params_.at(index);
+    std::lock_guard<std::mutex> lock(params.data_mutex);
+    return params.polled_handles.count(handle) != 0;
+}
+
 void VYRServiceTestPeer::DeliverBinderDeath(VYRService& service, AIBinder* binder) {
     service.HandleBinderDied(binder);
 }

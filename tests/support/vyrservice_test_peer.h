@@ -12,6 +12,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <unordered_map>
 
 #include "vyrservice.h"
@@ -39,6 +40,10 @@ class VYRServiceTestPeer {
     // Makes `pid` the only process that uses `handle`, as if that process had opened it and
     // made every call on it: its end releases the handle.
     static void SetOnlyClientProcess(VYRService& service, int32_t handle, pid_t pid);
+    // The entry of an open handle, for a test that watches its state from another thread.
+    static std::shared_ptr<ClientEntry> Entry(VYRService& service, int32_t handle);
+    // Whether `handle` has taken the sample that the block holds now.
+    static bool HasTakenSample(VYRService& service, size_t index, int32_t handle);
     // What a death notice for the callback binder `binder` does.
     static void DeliverBinderDeath(VYRService& service, AIBinder* binder);
 };

@@ -57,6 +57,14 @@ class FakeService : public aidl::android::vyr::BnVYRService {
         *result = -22;
         return ndk::ScopedAStatus::ok();
     }
+    ndk::ScopedAStatus EnableOnSample(int32_t, int32_t, int32_t, int32_t* result) override {
+        *result = -38;
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus Flush(int32_t, int32_t* result) override {
+        *result = -38;
+        return ndk::ScopedAStatus::ok();
+    }
     ndk::ScopedAStatus PollOnce(int32_t handle, Event* event, int32_t* result) override {
         if (handle != 42) {
             *result = -61;
@@ -145,8 +153,13 @@ TEST(OptionsTest, StreamOptions) {
     EXPECT_EQ(options.period_ms, 100);
     EXPECT_EQ(options.count, 5);
     EXPECT_TRUE(options.json);
+    EXPECT_EQ(options.interface_version, 2);
+    ASSERT_TRUE(ParseStreamOptions({"range", "--interface", "1"}, &options, &error)) << error;
+    EXPECT_EQ(options.interface_version, 1);
 
     StreamOptions bad;
+    EXPECT_FALSE(ParseStreamOptions({"als", "--interface", "3"}, &bad, &error));
+    EXPECT_FALSE(ParseStreamOptions({"als", "--interface", "0"}, &bad, &error));
     EXPECT_FALSE(ParseStreamOptions({"sonar"}, &bad, &error));
     EXPECT_FALSE(ParseStreamOptions({"als", "--period", "0"}, &bad, &error));
     EXPECT_FALSE(ParseStreamOptions({"als", "--callback", "--poll"}, &bad, &error));
@@ -216,11 +229,12 @@ TEST(EventFormatTest, AlsJsonNamesTheValues) {
     event.value0 = 4500;
     event.value1 = 120.5f;
     event.data = {1, 2, 3, 5, 4};
-    EXPECT_EQ(FormatEventJson(kModeAls, 9, event),
+    event.boottime = 1000;
+    EXPECT_EQ(FormatEventJson(kModeAls, 9, event, 1250),
               "{\"format\":1,\"sensor\":\"als\",\"handle\":9,\"status\":1,\"timestamp\":7,"
               "\"value0\":4500,"
               "\"value1\":120.5,\"data\":[1,2,3,5,4],\"lux\":120.5,\"color_temperature\":4500,"
-              "\"channels\":[1,2,3,5,4]}");
+              "\"channels\":[1,2,3,5,4],\"boottime_ns\":1000,\"received_boottime_ns\":1250}");
 }
 
 DemoState StateWithThreeZones() {

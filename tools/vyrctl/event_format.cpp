@@ -115,7 +115,8 @@ std::string FormatEventReadable(int32_t mode, const Event& event) {
     return "mode " + std::to_string(mode) + " " + FormatEventRaw(event);
 }
 
-std::string FormatEventJson(int32_t mode, int32_t handle, const Event& event) {
+std::string FormatEventJson(int32_t mode, int32_t handle, const Event& event,
+                            int64_t received_boottime_ns) {
     std::string json =
         std::string("{\"format\":") + std::to_string(kRecordingFormat) + ",\"sensor\":\"" +
         ModeName(mode) + "\",\"handle\":" + std::to_string(handle) +
@@ -138,7 +139,8 @@ std::string FormatEventJson(int32_t mode, int32_t handle, const Event& event) {
         }
         json += "]";
     }
-    return json + "}";
+    return json + ",\"boottime_ns\":" + std::to_string(event.boottime) +
+           ",\"received_boottime_ns\":" + std::to_string(received_boottime_ns) + "}";
 }
 
 }  // namespace vyrctl

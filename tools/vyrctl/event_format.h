@@ -54,7 +54,10 @@ std::string FormatFloat(float value);
 std::string FormatEventRaw(const aidl::android::vyr::Event& event);
 // One human-readable line with the decoded values of the given mode.
 std::string FormatEventReadable(int32_t mode, const aidl::android::vyr::Event& event);
-// One JSON object (no newline) with the raw fields and the decoded values.
-std::string FormatEventJson(int32_t mode, int32_t handle, const aidl::android::vyr::Event& event);
+// One JSON object (no newline) with the raw fields and the decoded values, then the reading's
+// boot time ("boottime_ns") and the boot time at which OnEvent (or the poll) returned it
+// ("received_boottime_ns"): the sample's age when the client got it is their difference.
+std::string FormatEventJson(int32_t mode, int32_t handle, const aidl::android::vyr::Event& event,
+                            int64_t received_boottime_ns);
 
 }  // namespace vyrctl

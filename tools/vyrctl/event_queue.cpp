@@ -5,20 +5,20 @@
 
 namespace vyrctl {
 
-void EventQueue::Push(const aidl::android::vyr::Event& event) {
+void EventQueue::Push(ReceivedEvent event) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
-        events_.push_back(event);
+        events_.push_back(std::move(event));
     }
     changed_.notify_all();
 }
 
-std::optional<aidl::android::vyr::Event> EventQueue::Pop(std::chrono::milliseconds timeout) {
+std::optional<ReceivedEvent> EventQueue::Pop(std::chrono::milliseconds timeout) {
     std::unique_lock<std::mutex> lock(mutex_);
     if (!changed_.wait_for(lock, timeout, [this] { return !events_.empty(); })) {
         return std::nullopt;
     }
-    aidl::android::vyr::Event event = std::move(events_.front());
+    ReceivedEvent event = std::move(events_.front());
     events_.pop_front();
     return event;
 }

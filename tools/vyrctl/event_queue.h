@@ -10,22 +10,29 @@
 
 #include <chrono>
 #include <condition_variable>
+#include <cstdint>
 #include <deque>
 #include <mutex>
 #include <optional>
 
 namespace vyrctl {
 
+// An event with the boot time at which OnEvent ran, in nanoseconds.
+struct ReceivedEvent {
+    aidl::android::vyr::Event event;
+    int64_t received_boottime_ns = 0;
+};
+
 class EventQueue {
   public:
-    void Push(const aidl::android::vyr::Event& event);
+    void Push(ReceivedEvent event);
     // The oldest event, or nothing after `timeout`.
-    std::optional<aidl::android::vyr::Event> Pop(std::chrono::milliseconds timeout);
+    std::optional<ReceivedEvent> Pop(std::chrono::milliseconds timeout);
 
   private:
     std::mutex mutex_;
     std::condition_variable changed_;
-    std::deque<aidl::android::vyr::Event> events_;
+    std::deque<ReceivedEvent> events_;
 };
 
 }  // namespace vyrctl

@@ -153,6 +153,12 @@ bool ParseStreamOptions(const std::vector<std::string>& args, StreamOptions* opt
             options->json = true;
         } else if (arg == "--no-reconnect") {
             options->reconnect = false;
+        } else if (arg == "--interface") {
+            if (!TakePositiveInt(args, &i, arg, &options->interface_version, error)) return false;
+            if (options->interface_version > 2) {
+                *error = "--interface must be 1 or 2";
+                return false;
+            }
         } else {
             *error = "unknown stream option '" + arg + "'";
             return false;
@@ -191,10 +197,11 @@ std::string UsageText() {
            "  shell                      read commands from stdin, one result line each "
            "('help' lists them)\n"
            "  stream als|range [--period MS] [--callback|--poll] [--count N | --seconds S]\n"
-           "         [--low-power] [--json] [--no-reconnect]\n"
+           "         [--low-power] [--json] [--no-reconnect] [--interface 1|2]\n"
            "                             print each event of one sensor until done or Ctrl-C;\n"
            "                             carries on across restarts of the service unless\n"
-           "                             --no-reconnect\n"
+           "                             --no-reconnect; a callback stream of interface 2 (the\n"
+           "                             default) gets each sample as it is read, 1 on a timer\n"
            "  configure V0 ... V10       send eleven control values to the range sensor\n"
            "  torch STATE                tell the light sensor the camera torch state\n"
            "  dump [--json]              the service's state: sensors, modes, clients, queues,\n"

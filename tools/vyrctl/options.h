@@ -40,6 +40,8 @@ struct StreamOptions {
     bool json = false;
     // Re-attach when the service restarts; false: end with an error.
     bool reconnect = true;
+    // The newest interface version to use (--interface 1: the timer of version 1).
+    int32_t interface_version = 2;
 };
 
 struct DemoViewOptions {

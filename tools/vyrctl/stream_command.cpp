@@ -3,6 +3,7 @@
 
 #include "stream_command.h"
 
+#include <time.h>
 #include <vyr/sensor_client.h>
 
 #include <algorithm>
@@ -24,6 +25,12 @@ namespace {
 
 constexpr milliseconds kWaitSlice{50};
 
+int64_t BootTimeNs() {
+    timespec now{};
+    clock_gettime(CLOCK_BOOTTIME, &now);
+    return int64_t{now.tv_sec} * 1000000000 + now.tv_nsec;
+}
+
 class Stream : public vyr::SensorClientListener {
   public:
     Stream(const Connection& connection, const StreamOptions& options, LineWriter* out,
@@ -38,6 +45,7 @@ class Stream : public vyr::SensorClientListener {
         settings.period_ms = options_.period_ms;
         settings.use_callback = options_.use_callback;
         if (options_.low_power) settings.low_power = true;
+        settings.max_interface_version = options_.interface_version;
         vyr::ReattachPolicy policy;
         policy.reattach = options_.reconnect;
         SensorClient client(settings, this, policy);
@@ -62,7 +70,7 @@ class Stream : public vyr::SensorClientListener {
         return exit_status;
     }
 
-    void OnEvent(const Event& event) override { queue_.Push(event); }
+    void OnEvent(const Event& event) override { queue_.Push({event, BootTimeNs()}); }
 
     void OnServiceLost(int32_t handle) override {
         if (!options_.reconnect) {
@@ -112,13 +120,15 @@ class Stream : public vyr::SensorClientListener {
         while (!Done(end)) {
             if (ended_) return 1;
             if (options_.use_callback) {
-                if (std::optional<Event> event = queue_.Pop(kWaitSlice)) Print(*event);
+                if (std::optional<ReceivedEvent> received = queue_.Pop(kWaitSlice)) {
+                    Print(received->event, received->received_boottime_ns);
+                }
                 continue;
             }
             Event event{};
             const int32_t result = client_->Poll(&event);
             if (result == 0) {
-                Print(event);
+                Print(event, BootTimeNs());
             } else if (result != -61 && result != SensorClient::kNotAttached) {
                 err_->WriteLine("error: poll -> " + DescribeResult(result));
                 return 1;
@@ -139,10 +149,11 @@ class Stream : public vyr::SensorClientListener {
         return end && steady_clock::now() >= *end;
     }
 
-    void Print(const Event& event) {
+    void Print(const Event& event, int64_t received_boottime_ns) {
         if (options_.count && printed_ >= *options_.count) return;
         ++printed_;
-        out_->WriteLine(options_.json ? FormatEventJson(options_.mode, client_->handle(), event)
+        out_->WriteLine(options_.json ? FormatEventJson(options_.mode, client_->handle(), event,
+                                                        received_boottime_ns)
                                       : FormatEventReadable(options_.mode, event));
     }
 

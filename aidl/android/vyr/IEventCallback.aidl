@@ -23,4 +23,9 @@ interface IEventCallback {
      * notifications; a dead client's handle is released through its death notice.
      */
     void OnEvent(in Event event);
+    // Version 2. The samples held for a client enabled with a maximum report latency, oldest
+    // first.
+    void OnEventBatch(in Event[] events);
+    // Version 2. Everything held for `handle` when its Flush was called has been delivered.
+    void OnFlushComplete(int handle);
 }

@@ -59,4 +59,11 @@ interface IVYRService {
     int ConfigureParameters(int handle, in int[] params);
     /** Tells the light sensor the camera torch's state (its low 8 bits); no handle needed. */
     void SetTorchLightState(int state);
+    // Version 2. Enables a handle like Enable, but a callback gets each sample as soon as it is
+    // stored (every k-th one, k = max(1, round(period / active period))) with no timer of its
+    // own. With maxReportLatency > 0 (milliseconds) samples are held up to that long and handed
+    // over together through OnEventBatch, which a version 1 callback lacks (-95).
+    int EnableOnSample(int handle, int period, int maxReportLatency);
+    // Version 2. Delivers what is held for the handle at once, then calls OnFlushComplete.
+    int Flush(int handle);
 }

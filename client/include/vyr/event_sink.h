@@ -8,6 +8,7 @@
 #include <aidl/android/vyr/BnEventCallback.h>
 
 #include <functional>
+#include <vector>
 
 namespace vyr {
 
@@ -18,6 +19,9 @@ class EventSink : public aidl::android::vyr::BnEventCallback {
     explicit EventSink(Sink sink) : sink_(std::move(sink)) {}
 
     ndk::ScopedAStatus OnEvent(const aidl::android::vyr::Event& event) override;
+    // Each event of a batch in turn, oldest first.
+    ndk::ScopedAStatus OnEventBatch(const std::vector<aidl::android::vyr::Event>& events) override;
+    ndk::ScopedAStatus OnFlushComplete(int32_t handle) override;
 
   private:
     const Sink sink_;

@@ -53,6 +53,10 @@ struct SensorSettings {
     std::optional<bool> low_power;
     // ConfigureParameters with these values, when not empty (range handles: eleven values).
     std::vector<int32_t> control_values;
+    // The newest interface version to use. From 2, a callback client of a service that offers
+    // version 2 is enabled on sample: each reading is pushed as soon as the service stores it,
+    // not on a timer of its own. 1 keeps the timer of version 1 on every service.
+    int32_t max_interface_version = 2;
 };
 
 struct ReattachPolicy {
@@ -71,6 +75,8 @@ struct ReattachPolicy {
 class SensorClientListener {
   public:
     virtual ~SensorClientListener() = default;
+    // `event.boottime` is when the service read the sample, in CLOCK_BOOTTIME nanoseconds (0 from
+    // a service of version 1).
     virtual void OnEvent(const aidl::android::vyr::Event& /*event*/) {}
     // The service's binder died; `handle` is gone with it.
     virtual void OnServiceLost(int32_t /*handle*/) {}

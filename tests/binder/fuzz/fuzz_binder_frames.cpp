@@ -50,6 +50,10 @@ class NullService : public BnVYRService {
         return Ok(r);
     }
     ndk::ScopedAStatus SetTorchLightState(int32_t) override { return ndk::ScopedAStatus::ok(); }
+    ndk::ScopedAStatus EnableOnSample(int32_t, int32_t, int32_t, int32_t* r) override {
+        return Ok(r);
+    }
+    ndk::ScopedAStatus Flush(int32_t, int32_t* r) override { return Ok(r); }
 
   private:
     static ndk::ScopedAStatus Ok(int32_t* r) {

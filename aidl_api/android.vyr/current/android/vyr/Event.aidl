@@ -23,4 +23,5 @@ parcelable Event {
   float value0;
   float value1;
   float[] data;
+  long boottime;
 }

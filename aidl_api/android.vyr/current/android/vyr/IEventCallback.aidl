@@ -19,4 +19,6 @@
 package android.vyr;
 interface IEventCallback {
   void OnEvent(in android.vyr.Event event);
+  void OnEventBatch(in android.vyr.Event[] events);
+  void OnFlushComplete(int handle);
 }

@@ -27,4 +27,6 @@ interface IVYRService {
   int PollOnce(int handle, out android.vyr.Event event);
   int ConfigureParameters(int handle, in int[] params);
   void SetTorchLightState(int state);
+  int EnableOnSample(int handle, int period, int maxReportLatency);
+  int Flush(int handle);
 }

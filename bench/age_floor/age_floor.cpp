@@ -1,0 +1,183 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
+// The floor of a sample's age when a callback client receives it: the same wake-up and calls as
+// the service's delivery on sample, with nothing else in it. A sensor thread stamps each sample
+// with CLOCK_BOOTTIME and wakes N sender threads through one condition variable; each sender
+// sends an event's bytes to a client process of its own and waits for the reply (a two-way
+// call). The client process notes the boot time at which it has read the event and returns the
+// sample's age in the reply.
+//
+//   bench_age_floor [--clients N] [--period-ms P] [--seconds S]
+//
+// Prints "p50 X ms, p99 Y ms (N events)".
+#include <android-base/file.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+namespace {
+
+// A range event's frame and the reply to it, as the service sends and receives them.
+constexpr size_t kEventBytes = 340;
+constexpr size_t kReplyBytes = 60;
+// Ages before this are of the start-up, not of the steady state.
+constexpr auto kSettle = std::chrono::milliseconds(1500);
+
+struct Options {
+    int clients = 1;
+    int period_ms = 33;
+    double seconds = 10;
+};
+
+int64_t BootTimeNs() {
+    timespec now{};
+    clock_gettime(CLOCK_BOOTTIME, &now);
+    return int64_t{now.tv_sec} * 1000000000 + now.tv_nsec;
+}
+
+std::atomic<bool> g_stop{false};
+std::atomic<bool> g_counting{false};
+std::mutex g_sample_mutex;
+std::condition_variable g_sample_cv;
+uint64_t g_sample = 0;
+int64_t g_sample_boottime = 0;
+
+void Echo(int fd) {
+    char event[kEventBytes];
+    char reply[kReplyBytes] = {};
+    while (android::base::ReadFully(fd, event, sizeof(event))) {
+        int64_t read_at = BootTimeNs();
+        int64_t stamp = 0;
+        memcpy(&stamp, event, sizeof(stamp));
+        const int64_t age = read_at - stamp;
+        memcpy(reply, &age, sizeof(age));
+        if (write(fd, reply, sizeof(reply)) != static_cast<ssize_t>(sizeof(reply))) break;
+    }
+    _exit(0);
+}
+
+void Sensor(const Options& options) {
+    const auto period = std::chrono::milliseconds(options.period_ms);
+    auto next = std::chrono::steady_clock::now() + period;
+    std::mutex mutex;
+    std::condition_variable cv;
+    while (!g_stop.load()) {
+        {
+            std::unique_lock<std::mutex> lock(mutex);
+            while (std::chrono::steady_clock::now() < next) cv.wait_until(lock, next);
+        }
+        next += period;
+        {
+            std::lock_guard<std::mutex> lock(g_sample_mutex);
+            ++g_sample;
+            g_sample_boottime = BootTimeNs();
+        }
+        g_sample_cv.notify_all();
+    }
+    g_sample_cv.notify_all();
+}
+
+void Sender(int fd, std::vector<int64_t>* ages) {
+    char event[kEventBytes] = {2};
+    char reply[kReplyBytes];
+    uint64_t taken = 0;
+    while (true) {
+        int64_t stamp = 0;
+        {
+            std::unique_lock<std::mutex> lock(g_sample_mutex);
+            g_sample_cv.wait(lock, [&] { return g_stop.load() || g_sample != taken; });
+            if (g_stop.load()) return;
+            taken = g_sample;
+            stamp = g_sample_boottime;
+        }
+        memcpy(event, &stamp, sizeof(stamp));
+        if (write(fd, event, sizeof(event)) != static_cast<ssize_t>(sizeof(event))) return;
+        // Waiting as the runtime does: poll, then read.
+        pollfd readable{fd, POLLIN, 0};
+        poll(&readable, 1, -1);
+        if (!android::base::ReadFully(fd, reply, sizeof(reply))) return;
+        int64_t age = 0;
+        memcpy(&age, reply, sizeof(age));
+        if (g_counting.load()) ages->push_back(age);
+    }
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    Options options;
+    for (int i = 1; i + 1 < argc; i += 2) {
+        if (strcmp(argv[i], "--clients") == 0) {
+            options.clients = atoi(argv[i + 1]);
+        } else if (strcmp(argv[i], "--period-ms") == 0) {
+            options.period_ms = atoi(argv[i + 1]);
+        } else if (strcmp(argv[i], "--seconds") == 0) {
+            options.seconds = atof(argv[i + 1]);
+        } else {
+            fprintf(stderr, "unknown option %s\n", argv[i]);
+            return 2;
+        }
+    }
+    if (options.clients < 1 || options.period_ms < 1 || options.seconds <= 0) {
+        fprintf(stderr, "usage: bench_age_floor [--clients N] [--period-ms P] [--seconds S]\n");
+        return 2;
+    }
+    std::vector<int> fds;
+    for (int i = 0; i < options.clients; ++i) {
+        int pair[2];
+        if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, pair) != 0) return 1;
+        if (fork() == 0) {
+            close(pair[0]);
+            Echo(pair[1]);
+        }
+        close(pair[1]);
+        fds.push_back(pair[0]);
+    }
+    std::vector<std::vector<int64_t>> ages(options.clients);
+    std::vector<std::thread> threads;
+    threads.emplace_back(Sensor, std::cref(options));
+    for (int i = 0; i < options.clients; ++i) threads.emplace_back(Sender, fds[i], &ages[i]);
+
+    std::this_thread::sleep_for(kSettle);
+    g_counting = true;
+    std::this_thread::sleep_for(std::chrono::duration<double>(options.seconds));
+    g_counting = false;
+    {
+        std::lock_guard<std::mutex> lock(g_sample_mutex);
+        g_stop = true;
+    }
+    g_sample_cv.notify_all();
+    for (std::thread& thread : threads) thread.join();
+    for (int fd : fds) close(fd);
+    while (wait(nullptr) > 0) {
+    }
+    std::vector<int64_t> all;
+    for (const auto& client : ages) all.insert(all.end(), client.begin(), client.end());
+    if (all.empty()) {
+        printf("no events\n");
+        return 1;
+    }
+    std::sort(all.begin(), all.end());
+    const auto at = [&all](double q) {
+        return static_cast<double>(
+                   all[std::min(all.size() - 1, static_cast<size_t>(q * all.size()))]) /
+               1e6;
+    };
+    printf("p50 %.2f ms, p99 %.2f ms (%zu events)\n", at(0.5), at(0.99), all.size());
+    return 0;
+}

@@ -1,0 +1,58 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
+#pragma once
+
+#include <aidl/android/vyr/Event.h>
+#include <android-base/thread_annotations.h>
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <vector>
+
+#include "client_entry.h"
+#include "service_mode_params.h"
+
+namespace android {
+namespace vyr {
+namespace binder {
+
+// Hands the samples of the mode blocks to clients, each sample at most once per handle: by poll,
+// by the version 1 timer loop (a client's own period), and by the version 2 delivery on sample
+// (woken by the processing loop, every k-th sample, optionally held for a report latency).
+class EventDelivery {
+  public:
+    using ParamsForMode = std::function<ServiceModeParams&(int32_t mode)>;
+
+    explicit EventDelivery(ParamsForMode params_for_mode);
+
+    // Fills `event` with the latest sample of `mode` if `handle` has not taken it yet.
+    bool PollInternal(int32_t handle, int32_t mode, aidl::android::vyr::Event* event);
+
+    // Marks an entry, already given its period (and latency and `on_sample`), enabled and starts
+    // its delivery thread when it has a callback. The generation is raised and the condition
+    // variable and mutex are replaced before the state is published: a thread let go by a nested
+    // Disable that sees the client enabled again then also sees a generation that is not its own,
+    // and never touches the objects being replaced.
+    void Start(int32_t handle, const std::shared_ptr<ClientEntry>& entry);
+
+    // Called by the processing loop as it stores a sample, with the block's data_mutex held and
+    // its `sample_signals`: wakes the clients enabled on sample.
+    static void SampleStored(const std::vector<std::shared_ptr<SampleSignal>>& signals);
+
+  private:
+    // Version 1: polls once per client period.
+    void NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry, uint64_t generation);
+    // Version 2: woken by each stored sample; no timer but the report latency's.
+    void SampleLoop(int32_t handle, std::shared_ptr<ClientEntry> entry, uint64_t generation,
+                    std::shared_ptr<SampleSignal> signal);
+    void Subscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal);
+    void Unsubscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal);
+
+    const ParamsForMode params_for_mode_;
+};
+
+}  // namespace binder
+}  // namespace vyr
+}  // namespace android
