@@ -30,7 +30,10 @@ parcelable Event {
      * and 11 values per zone for each of the zone count's zones: 10 + 11 x zone count values.
      */
     float[] data;
-    // When the sensor library returned the reading, in CLOCK_BOOTTIME nanoseconds: the clock of
-    // camera frames (elapsedRealtimeNanos), so that a reading can be matched to a frame.
+    /**
+     * Version 2: when the sensor library returned the reading, in CLOCK_BOOTTIME nanoseconds, the
+     * clock of camera frames (elapsedRealtimeNanos), so that a reading can be matched to a frame.
+     * A version 1 reader never sees it.
+     */
     long boottime;
 }

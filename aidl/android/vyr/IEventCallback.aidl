@@ -12,7 +12,8 @@ import android.vyr.Event;
  */
 interface IEventCallback {
     /**
-     * One new sample of the client's mode, delivered at most once, at most once per client period.
+     * One new sample of the client's mode, delivered at most once: once per client period for a
+     * client enabled with Enable, as each sample is stored for one enabled with EnableOnSample.
      *
      * The service calls it from that client's own notification thread and waits for it to return;
      * the next poll is one period after the return, so a slow OnEvent lengthens its own cycle and

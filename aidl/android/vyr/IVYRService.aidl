@@ -14,7 +14,7 @@ import android.vyr.IEventCallback;
  * Result codes: each method's result code is its return value, so the generated C++ carries it
  * as the last out-parameter; the binder status itself is always OK, also when the call failed.
  * Codes are 0, a handle, -1 or a negated errno: -17 EEXIST, -19 ENODEV, -22 EINVAL, -38 ENOSYS,
- * -61 ENODATA. Methods without a result report nothing.
+ * -61 ENODATA, and in version 2 -95 EOPNOTSUPP. Methods without a result report nothing.
  *
  * Threading: every call runs on a binder thread of the service, and all of them one at a time
  * under one lock; a call that waits more than 10 s for it ends the service. Periods are
