@@ -272,25 +272,32 @@ void VYRService::ForgetProcesses(const ClientEntry& entry) {
 
 // Enable, disable and low power.
 
-ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* result) {
-    LOCK_API();
+std::shared_ptr<ClientEntry> VYRService::EnableTarget(const char* method, int32_t handle,
+                                                      int32_t* result) {
     auto it = clients_.find(handle);
     if (it == clients_.end()) {
-        ALOGE("%s invalid handle %d", __func__, handle);
+        ALOGE("%s invalid handle %d", method, handle);
         *result = -ENOSYS;
-        return Ok();
+        return nullptr;
     }
-    ClientEntry& entry = *it->second;
-    NoteCaller(&entry);
-    if (entry.state == kClientEnabled) {
+    NoteCaller(it->second.get());
+    if (it->second->state == kClientEnabled) {
         *result = -EEXIST;
-        return Ok();
+        return nullptr;
     }
+    return it->second;
+}
+
+ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* result) {
+    LOCK_API();
+    std::shared_ptr<ClientEntry> target = EnableTarget(__func__, handle, result);
+    if (target == nullptr) return Ok();
+    ClientEntry& entry = *target;
     ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
     entry.period = period >= 1 ? period : kDefaultPeriodMs;
     entry.on_sample = false;
     entry.max_report_latency = 0;
-    StartClient(handle, it->second);
+    StartClient(handle, target);
     *result = 0;
     return Ok();
 }
@@ -299,18 +306,9 @@ ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
                                               int32_t max_report_latency, int32_t* result) {
     LearnCallbackVersion(handle);
     LOCK_API();
-    auto it = clients_.find(handle);
-    if (it == clients_.end()) {
-        ALOGE("%s invalid handle %d", __func__, handle);
-        *result = -ENOSYS;
-        return Ok();
-    }
-    ClientEntry& entry = *it->second;
-    NoteCaller(&entry);
-    if (entry.state == kClientEnabled) {
-        *result = -EEXIST;
-        return Ok();
-    }
+    std::shared_ptr<ClientEntry> target = EnableTarget(__func__, handle, result);
+    if (target == nullptr) return Ok();
+    ClientEntry& entry = *target;
     if (max_report_latency < 0 || (max_report_latency > 0 && !entry.callback)) {
         ALOGE("%s handle %d: invalid max report latency %d", __func__, handle, max_report_latency);
         *result = -EINVAL;
@@ -327,7 +325,7 @@ ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
     entry.period = period >= 1 ? period : kDefaultPeriodMs;
     entry.on_sample = true;
     entry.max_report_latency = max_report_latency;
-    StartClient(handle, it->second);
+    StartClient(handle, target);
     *result = 0;
     return Ok();
 }

@@ -132,6 +132,10 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     DumpValue DumpDisplay() const;
     DumpValue DumpEvents() const;
 
+    // The client that Enable or EnableOnSample (`method`) may enable, with its caller noted; null
+    // with `*result` set for an unknown handle (-38) or a client already enabled (-17).
+    std::shared_ptr<ClientEntry> EnableTarget(const char* method, int32_t handle, int32_t* result)
+        REQUIRES(api_lock_);
     // What Enable and EnableOnSample share once the entry is set up: the delivery thread, the
     // work item and the dump's record.
     void StartClient(int32_t handle, const std::shared_ptr<ClientEntry>& entry) REQUIRES(api_lock_);

@@ -63,6 +63,7 @@ typedef int32_t binder_exception_t;
 struct AStatus;
 typedef struct AStatus AStatus;
 
+// Each of these returns a new status that the caller owns (AStatus_delete).
 __attribute__((warn_unused_result)) AStatus* AStatus_newOk(void) __INTRODUCED_IN(29);
 __attribute__((warn_unused_result)) AStatus* AStatus_fromExceptionCode(binder_exception_t exception)
     __INTRODUCED_IN(29);
@@ -75,9 +76,13 @@ __attribute__((warn_unused_result)) AStatus* AStatus_fromServiceSpecificErrorWit
 __attribute__((warn_unused_result)) AStatus* AStatus_fromStatus(binder_status_t status)
     __INTRODUCED_IN(29);
 
+// True when the exception is EX_NONE.
 bool AStatus_isOk(const AStatus* status) __INTRODUCED_IN(29);
 binder_exception_t AStatus_getExceptionCode(const AStatus* status) __INTRODUCED_IN(29);
+// Meaningful only when the exception is EX_SERVICE_SPECIFIC.
 int32_t AStatus_getServiceSpecificError(const AStatus* status) __INTRODUCED_IN(29);
+// Meaningful only when the exception is EX_TRANSACTION_FAILED: the transport status of a call
+// that failed (STATUS_DEAD_OBJECT, STATUS_FAILED_TRANSACTION, ...).
 binder_status_t AStatus_getStatus(const AStatus* status) __INTRODUCED_IN(29);
 // Never null; the empty string when there is no message. Owned by the status.
 const char* AStatus_getMessage(const AStatus* status) __INTRODUCED_IN(29);
@@ -85,6 +90,7 @@ const char* AStatus_getMessage(const AStatus* status) __INTRODUCED_IN(29);
 __attribute__((warn_unused_result)) const char* AStatus_getDescription(const AStatus* status)
     __INTRODUCED_IN(30);
 void AStatus_deleteDescription(const char* description) __INTRODUCED_IN(30);
+// Frees a status made by the functions above or received from a call.
 void AStatus_delete(AStatus* status) __INTRODUCED_IN(29);
 
 __END_DECLS
