@@ -27,6 +27,7 @@
 #include "recording_callback.h"
 #include "service_dump.h"
 #include "service_process.h"
+#include "shared_service_test.h"
 
 namespace vyr_datapath {
 namespace {
@@ -36,11 +37,8 @@ using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 using vyr_test::ChildProcess;
-using vyr_test::ServiceProcess;
 
 constexpr int32_t kRange = 3;
-// The service waits 4 s before it registers; sanitizer builds start slower still.
-constexpr milliseconds kRegistration{30000};
 constexpr milliseconds kWait{10000};
 
 // The number after "key": in one line of vyrctl's JSON output.
@@ -71,29 +69,11 @@ bool ExitedWith(const std::optional<int>& status, int code) {
     return status && WIFEXITED(*status) && WEXITSTATUS(*status) == code;
 }
 
-class CrossProcessTest : public ::testing::Test {
+class CrossProcessTest : public SharedServiceTest {
   protected:
-    static void SetUpTestSuite() {
-        // This process is a client with callbacks of its own in some tests.
-        ABinderProcess_startThreadPool();
-        process_ = new ServiceProcess();
-        if (process_->Start(VYRSERVICE_PATH)) service_ = process_->WaitForService(kRegistration);
-    }
-
-    static void TearDownTestSuite() {
-        service_.reset();
-        delete process_;
-        process_ = nullptr;
-    }
-
     void SetUp() override {
-        ASSERT_NE(service_, nullptr) << "vyrservice did not register; its log:\n"
-                                     << process_->Log();
+        ASSERT_NO_FATAL_FAILURE(SharedServiceTest::SetUp());
         ASSERT_TRUE(process_->Running());
-    }
-
-    void TearDown() override {
-        EXPECT_TRUE(process_->Running()) << "vyrservice ended; its log:\n" << process_->Log();
     }
 
     std::unique_ptr<ChildProcess> Vyrctl(std::vector<std::string> args) {
@@ -145,13 +125,8 @@ class CrossProcessTest : public ::testing::Test {
         return true;
     }
 
-    static ServiceProcess* process_;
-    static std::shared_ptr<IVYRService> service_;
     int clients_ = 0;
 };
-
-ServiceProcess* CrossProcessTest::process_ = nullptr;
-std::shared_ptr<IVYRService> CrossProcessTest::service_;
 
 TEST_F(CrossProcessTest, CallbackClientReceivesEventsAtItsPeriod) {
     auto stream = Vyrctl({"--timeout", "10", "stream", "range", "--callback", "--period", "100",

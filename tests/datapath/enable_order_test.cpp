@@ -102,19 +102,11 @@ void operator delete[](void* memory, std::size_t) noexcept {
 namespace vyr_datapath {
 namespace {
 
-MultiRangingData Frame(uint32_t time_ms) {
-    MultiRangingData data{};
-    data.time_ms = time_ms;
-    data.zone_count = 1;
-    data.valid = 1;
-    return data;
-}
-
 class EnableOrderTest : public InProcessServiceTest {};
 
 TEST_F(EnableOrderTest, ThreadLetGoByANestedDisableNeverSeesAHalfMadeEnable) {
     StartService(false);
-    sensor_doubles::SetRangeData(Frame(7));
+    sensor_doubles::SetRangeData(RangeFrame(7));
     const int32_t handle = OpenOk(kRange);
     auto callback = NewCallback();
     int32_t result = 1;

@@ -18,6 +18,14 @@ constexpr size_t kModeBlocks[] = {0, 2};
 
 }  // namespace
 
+MultiRangingData RangeFrame(uint32_t time_ms) {
+    MultiRangingData data{};
+    data.time_ms = time_ms;
+    data.zone_count = 1;
+    data.valid = 1;
+    return data;
+}
+
 void InProcessServiceTest::SetUp() {
     sensor_doubles::Reset();
     StartService(true);

@@ -32,6 +32,9 @@ constexpr int32_t kRange = 3;
 using vyr_test::kTag;
 using vyr_test::kWait;
 
+// A valid one-zone range record of sensor time `time_ms`.
+MultiRangingData RangeFrame(uint32_t time_ms);
+
 class InProcessServiceTest : public vyr_test::ServiceFixture {
   protected:
     void SetUp() override;

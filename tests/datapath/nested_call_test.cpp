@@ -24,21 +24,13 @@ using aidl::android::vyr::Event;
 
 constexpr size_t kRangeBlock = 2;
 
-MultiRangingData Frame(uint32_t time_ms) {
-    MultiRangingData data{};
-    data.time_ms = time_ms;
-    data.zone_count = 1;
-    data.valid = 1;
-    return data;
-}
-
 class NestedCallTest : public InProcessServiceTest {
   protected:
     void SetUp() override {
         InProcessServiceTest::SetUp();
         // Without the light sensor there is no display monitor whose end could race the count.
         StartService(false);
-        sensor_doubles::SetRangeData(Frame(7));
+        sensor_doubles::SetRangeData(RangeFrame(7));
         idle_threads_ = vyr_test::ThreadCount();
         handle_ = OpenOk(kRange);
         callback_ = NewCallback();
@@ -122,7 +114,7 @@ TEST_F(NestedCallTest, EnableAfterANestedDisableStartsOneNewThread) {
     });
     EnableOk(handle_, 1);
     ASSERT_TRUE(callback_->WaitForEvents(1, kWait));
-    sensor_doubles::SetRangeData(Frame(9));
+    sensor_doubles::SetRangeData(RangeFrame(9));
     ASSERT_TRUE(callback_->WaitForEvents(2, kWait)) << "the new notification thread delivers";
     ASSERT_EQ(nested_result.wait_for(kWait), std::future_status::ready);
     EXPECT_EQ(nested_result.get(), 0);

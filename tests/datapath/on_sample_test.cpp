@@ -25,14 +25,6 @@ constexpr size_t kRangeBlock = 2;
 // Long enough that no batch falls due on its own during a test.
 constexpr int32_t kNeverDue = 600000;
 
-MultiRangingData Frame(uint32_t time_ms) {
-    MultiRangingData data{};
-    data.time_ms = time_ms;
-    data.zone_count = 1;
-    data.valid = 1;
-    return data;
-}
-
 int64_t BootTimeNs() {
     timespec now{};
     clock_gettime(CLOCK_BOOTTIME, &now);
@@ -90,7 +82,7 @@ class OnSampleTest : public InProcessServiceTest {
         return true;
     }
     void Publish(uint32_t time_ms) {
-        sensor_doubles::SetRangeData(Frame(time_ms));
+        sensor_doubles::SetRangeData(RangeFrame(time_ms));
         PublishNextSample();
     }
 
@@ -101,7 +93,7 @@ TEST_F(OnSampleTest, ClientAtThreeTimesTheActivePeriodGetsEveryThirdSample) {
     const int32_t poller = OpenOk(kRange);
     const int32_t pusher = OpenOk(kRange);
     auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(Frame(0));
+    sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);  // samples at 1 ms
     const int64_t enabled_at = BootTimeNs();
     ASSERT_EQ(EnableOnSample(pusher, 3, 0), 0);
@@ -127,7 +119,7 @@ TEST_F(OnSampleTest, ChangeOfTheActivePeriodChangesTheStride) {
     const int32_t poller = OpenOk(kRange);
     const int32_t pusher = OpenOk(kRange);
     auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(Frame(0));
+    sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
     ASSERT_EQ(EnableOnSample(pusher, 3, 0), 0);
     for (uint32_t t = 1; t <= 3; ++t) Publish(t);
@@ -144,7 +136,7 @@ TEST_F(OnSampleTest, ChangeOfTheActivePeriodChangesTheStride) {
 }
 
 TEST_F(OnSampleTest, BatchesHoldTheSamplesOfTheLatencyNoneLostNoneTwice) {
-    for (uint32_t t = 1; t <= 300; ++t) sensor_doubles::QueueRangeData(Frame(t));
+    for (uint32_t t = 1; t <= 300; ++t) sensor_doubles::QueueRangeData(RangeFrame(t));
     const int32_t pusher = OpenOk(kRange);
     auto callback = SetCallbackOk(pusher);
     ASSERT_EQ(EnableOnSample(pusher, 33, 300), 0);
@@ -166,7 +158,7 @@ TEST_F(OnSampleTest, FlushDeliversWhatIsHeldThenCompletes) {
     const int32_t poller = OpenOk(kRange);
     const int32_t pusher = OpenOk(kRange);
     auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(Frame(0));
+    sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
     ASSERT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
     for (uint32_t t = 1; t <= 2; ++t) {
@@ -188,7 +180,7 @@ TEST_F(OnSampleTest, FlushWithNothingHeldStillCompletes) {
     const int32_t direct = OpenOk(kRange);
     auto batched_callback = SetCallbackOk(batched);
     auto direct_callback = SetCallbackOk(direct);
-    sensor_doubles::SetRangeData(Frame(0));
+    sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
     ASSERT_EQ(EnableOnSample(batched, 1, kNeverDue), 0);
     ASSERT_EQ(EnableOnSample(direct, 1, 0), 0);
@@ -227,7 +219,7 @@ TEST_F(OnSampleTest, DisableEndsTheDeliveryThread) {
     const int32_t poller = OpenOk(kRange);
     const int32_t pusher = OpenOk(kRange);
     auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(Frame(0));
+    sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
     const size_t sampling_threads = vyr_test::ThreadCount();
     ASSERT_EQ(EnableOnSample(pusher, 1, 0), 0);
@@ -247,7 +239,7 @@ TEST_F(OnSampleTest, DeathOfTheClientEndsItsDelivery) {
     const int32_t poller = OpenOk(kRange);
     const int32_t pusher = OpenOk(kRange);
     auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(Frame(0));
+    sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
     const size_t sampling_threads = vyr_test::ThreadCount();
     ASSERT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
@@ -262,7 +254,7 @@ TEST_F(OnSampleTest, DeathOfTheClientEndsItsDelivery) {
 
 TEST_F(OnSampleTest, PolledEventCarriesTheBootTimeOfItsRead) {
     const int32_t poller = OpenOk(kRange);
-    sensor_doubles::SetRangeData(Frame(0));
+    sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
     Event event{};
     Poll(poller, &event);

@@ -17,6 +17,7 @@
 
 #include "child_process.h"
 #include "service_process.h"
+#include "shared_service_test.h"
 
 namespace vyr_datapath {
 namespace {
@@ -24,35 +25,11 @@ namespace {
 using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
 using vyr_test::ChildProcess;
-using vyr_test::ServiceProcess;
 
-// The service waits 4 s before it registers; sanitizer builds start slower still.
-constexpr milliseconds kRegistration{30000};
 constexpr milliseconds kWait{10000};
 
-class Version1ClientTest : public ::testing::Test {
+class Version1ClientTest : public SharedServiceTest {
   protected:
-    static void SetUpTestSuite() {
-        ABinderProcess_startThreadPool();
-        process_ = new ServiceProcess();
-        if (process_->Start(VYRSERVICE_PATH)) service_ = process_->WaitForService(kRegistration);
-    }
-
-    static void TearDownTestSuite() {
-        service_.reset();
-        delete process_;
-        process_ = nullptr;
-    }
-
-    void SetUp() override {
-        ASSERT_NE(service_, nullptr) << "vyrservice did not register; its log:\n"
-                                     << process_->Log();
-    }
-
-    void TearDown() override {
-        EXPECT_TRUE(process_->Running()) << "vyrservice ended; its log:\n" << process_->Log();
-    }
-
     std::unique_ptr<ChildProcess> Client(const std::string& mode) {
         auto child = std::make_unique<ChildProcess>(
             std::vector<std::string>{V1_CLIENT_PATH, mode}, process_->ClientEnvironment(),
@@ -60,13 +37,7 @@ class Version1ClientTest : public ::testing::Test {
         EXPECT_TRUE(child->started());
         return child;
     }
-
-    static ServiceProcess* process_;
-    static std::shared_ptr<IVYRService> service_;
 };
-
-ServiceProcess* Version1ClientTest::process_ = nullptr;
-std::shared_ptr<IVYRService> Version1ClientTest::service_;
 
 TEST_F(Version1ClientTest, EveryResultIsVersion1s) {
     auto client = Client("parts");
