@@ -3,6 +3,8 @@
 
 #include "client_entry.h"
 
+#include <utility>
+
 namespace android {
 namespace vyr {
 namespace binder {
@@ -36,6 +38,15 @@ void ClientEntry::Disable() {
     notify_cv.reset();
     notify_mutex.reset();
     sample_signal.reset();
+}
+
+std::unique_ptr<std::thread> ClientEntry::StopAndHandOver() {
+    StopNotify();
+    std::unique_ptr<std::thread> thread = std::move(notify_thread);
+    notify_cv.reset();
+    notify_mutex.reset();
+    sample_signal.reset();
+    return thread;
 }
 
 }  // namespace binder

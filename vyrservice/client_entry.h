@@ -50,6 +50,10 @@ struct ClientEntry {
     // for a caller that holds a lock which that thread may be waiting for (through a nested call
     // from OnEvent). The thread, its condition variable and mutex stay until Disable().
     void StopNotify();
+    // Marks the client disabled, wakes its thread and hands that thread over to be joined once the
+    // API lock is released (a client enabled on sample, whose callback may call back, be slow or
+    // never answer). The entry is at once ready for a new enable; the thread keeps what it uses.
+    std::unique_ptr<std::thread> StopAndHandOver();
     // Stopped by StopNotify, and its thread not yet joined.
     bool AwaitsJoin() const { return state == kClientDisabled && notify_thread != nullptr; }
 

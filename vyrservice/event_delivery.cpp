@@ -98,8 +98,11 @@ void EventDelivery::Start(int32_t handle, const std::shared_ptr<ClientEntry>& en
     if (entry->sample_signal) {
         // Subscribed before the thread starts: no sample stored after Enable returned is missed.
         Subscribe(entry->mode, entry->sample_signal);
-        entry->notify_thread = std::make_unique<std::thread>(
-            &EventDelivery::SampleLoop, this, handle, entry, generation, entry->sample_signal);
+        OnSampleClient client{
+            handle,     entry->mode,     entry->period,       entry->max_report_latency,
+            generation, entry->callback, entry->sample_signal};
+        entry->notify_thread = std::make_unique<std::thread>(&EventDelivery::SampleLoop, this,
+                                                             entry, std::move(client));
     } else {
         entry->notify_thread = std::make_unique<std::thread>(&EventDelivery::NotifyLoop, this,
                                                              handle, entry, generation);
@@ -178,18 +181,18 @@ uint64_t SampleStride(int32_t client_period, int32_t active_period) {
 
 }  // namespace
 
-void EventDelivery::SampleLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
-                               uint64_t generation, std::shared_ptr<SampleSignal> signal) {
+void EventDelivery::SampleLoop(std::shared_ptr<ClientEntry> entry, OnSampleClient client) {
+    const uint64_t generation = client.generation;
     const auto enabled = [&entry, generation] {
         return entry->state == kClientEnabled && entry->notify_generation == generation;
     };
-    // Read once: they change only with a new Enable, which starts a new thread.
-    const int32_t mode = entry->mode;
-    const int32_t period = entry->period;
-    const std::chrono::milliseconds latency(entry->max_report_latency);
+    const int32_t handle = client.handle;
+    const int32_t mode = client.mode;
+    const int32_t period = client.period;
+    const std::chrono::milliseconds latency(client.max_report_latency);
     ServiceModeParams& params = params_for_mode_(mode);
-    // Its own reference: OnEvent may call SetCallback or Close, which drop the entry's.
-    const std::shared_ptr<IEventCallback> callback = entry->callback;
+    const std::shared_ptr<IEventCallback>& callback = client.callback;
+    SampleSignal* const signal = client.signal.get();
 
     SampleSignal::Seen seen;
     uint64_t taken_at = 0;
@@ -234,7 +237,7 @@ void EventDelivery::SampleLoop(int32_t handle, std::shared_ptr<ClientEntry> entr
             callback->OnFlushComplete(handle);
         }
     }
-    Unsubscribe(mode, signal);
+    Unsubscribe(mode, client.signal);
 }
 
 }  // namespace binder

@@ -44,9 +44,20 @@ class EventDelivery {
   private:
     // Version 1: polls once per client period.
     void NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry, uint64_t generation);
+    // What a version 2 delivery thread is started with, copied from its entry under the API lock:
+    // once the thread is stopped, the lock is released before it is joined, and the entry may be
+    // set up anew meanwhile.
+    struct OnSampleClient {
+        int32_t handle = 0;
+        int32_t mode = 0;
+        int32_t period = 0;
+        int32_t max_report_latency = 0;
+        uint64_t generation = 0;
+        std::shared_ptr<aidl::android::vyr::IEventCallback> callback;
+        std::shared_ptr<SampleSignal> signal;
+    };
     // Version 2: woken by each stored sample; no timer but the report latency's.
-    void SampleLoop(int32_t handle, std::shared_ptr<ClientEntry> entry, uint64_t generation,
-                    std::shared_ptr<SampleSignal> signal);
+    void SampleLoop(std::shared_ptr<ClientEntry> entry, OnSampleClient client);
     void Subscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal);
     void Unsubscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal);
 

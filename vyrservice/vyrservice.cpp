@@ -219,12 +219,13 @@ ndk::ScopedAStatus VYRService::Open(int32_t mode, int32_t* result) {
 }
 
 ndk::ScopedAStatus VYRService::Close(int32_t handle) {
+    DeferredJoin after_unlock;
     LOCK_API();
-    CloseInternal(handle);
+    CloseInternal(handle, &after_unlock);
     return Ok();
 }
 
-void VYRService::CloseInternal(int32_t handle) {
+void VYRService::CloseInternal(int32_t handle, DeferredJoin* after_unlock) {
     auto it = clients_.find(handle);
     if (it == clients_.end()) {
         return;
@@ -238,9 +239,14 @@ void VYRService::CloseInternal(int32_t handle) {
     SweepDeathLinks();
     // Its death handler joins the thread and drops the callback after releasing the API lock.
     if (entry->AwaitsJoin()) return;
-    // The notification thread stops before the callback is dropped; one that is running this
-    // very call (from OnEvent) keeps the entry until it has ended.
-    entry->Disable();
+    if (entry->on_sample) {
+        // The thread holds the entry and its own reference to the callback.
+        after_unlock->Add(entry->StopAndHandOver());
+    } else {
+        // The notification thread stops before the callback is dropped; one that is running
+        // this very call (from OnEvent) keeps the entry until it has ended.
+        entry->Disable();
+    }
     entry->callback.reset();
 }
 
@@ -391,14 +397,15 @@ ndk::ScopedAStatus VYRService::Flush(int32_t handle, int32_t* result) {
 }
 
 ndk::ScopedAStatus VYRService::Disable(int32_t handle) {
+    DeferredJoin after_unlock;
     LOCK_API();
     auto it = clients_.find(handle);
     if (it != clients_.end()) NoteCaller(it->second.get());
-    DisableInternal(handle, /*client_died=*/false);
+    DisableInternal(handle, /*client_died=*/false, &after_unlock);
     return Ok();
 }
 
-void VYRService::DisableInternal(int32_t handle, bool client_died) {
+void VYRService::DisableInternal(int32_t handle, bool client_died, DeferredJoin* after_unlock) {
     auto it = clients_.find(handle);
     if (it == clients_.end()) {
         ALOGW("%s invalid handle %d", __func__, handle);
@@ -412,7 +419,10 @@ void VYRService::DisableInternal(int32_t handle, bool client_died) {
     ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
     if (client_died) {
         entry.StopNotify();
+    } else if (entry.on_sample) {
+        after_unlock->Add(entry.StopAndHandOver());
     } else {
+        // A version 1 client's thread is joined under the API lock.
         entry.Disable();
     }
     QueueForMode(entry.mode).PushAndSignal(WorkItem{false, entry.mode, handle, 0});
@@ -538,18 +548,21 @@ void VYRService::OnBinderDied(void* cookie) {
 
 void VYRService::HandleBinderDied(AIBinder* binder) {
     std::vector<std::shared_ptr<ClientEntry>> released;
+    DeferredJoin after_unlock;
     {
         LOCK_API();
         auto it = std::find_if(clients_.begin(), clients_.end(), [binder](const auto& client) {
             return client.second->callback_binder.get() == binder;
         });
-        if (it != clients_.end()) ReleaseDeadClient(it->first, "callback", &released);
+        if (it != clients_.end())
+            ReleaseDeadClient(it->first, "callback", &released, &after_unlock);
     }
     FinishRelease(&released);
 }
 
 void VYRService::ReleaseDeadClient(int32_t handle, const std::string& cause,
-                                   std::vector<std::shared_ptr<ClientEntry>>* released) {
+                                   std::vector<std::shared_ptr<ClientEntry>>* released,
+                                   DeferredJoin* after_unlock) {
     std::shared_ptr<ClientEntry> entry = clients_.at(handle);
     ALOGI("client %d mode %d died; disable sensor and remove client handle", handle, entry->mode);
     RecordEvent("death of handle " + std::to_string(handle) + " (" + cause + ")");
@@ -558,8 +571,8 @@ void VYRService::ReleaseDeadClient(int32_t handle, const std::string& cause,
         // nothing: the link whose notice runs now ends with it, and the runtime reports that.
         AIBinder_unlinkToDeath(entry->callback_binder.get(), entry->death_recipient, nullptr);
     }
-    DisableInternal(handle, /*client_died=*/true);
-    CloseInternal(handle);
+    DisableInternal(handle, /*client_died=*/true, after_unlock);
+    CloseInternal(handle, after_unlock);
     released->push_back(std::move(entry));
 }
 
@@ -573,6 +586,7 @@ void VYRService::FinishRelease(std::vector<std::shared_ptr<ClientEntry>>* releas
 
 void VYRService::HandleClientProcessExit(ClientProcessWatcher::ProcessId id, pid_t pid) {
     std::vector<std::shared_ptr<ClientEntry>> released;
+    DeferredJoin after_unlock;
     {
         LOCK_API();
         std::vector<int32_t> handles;
@@ -588,7 +602,7 @@ void VYRService::HandleClientProcessExit(ClientProcessWatcher::ProcessId id, pid
         // The same record and clean-up as a death notice.
         for (int32_t handle : handles) {
             ALOGI("Receive binder death callback");
-            ReleaseDeadClient(handle, "process " + std::to_string(pid), &released);
+            ReleaseDeadClient(handle, "process " + std::to_string(pid), &released, &after_unlock);
         }
     }
     FinishRelease(&released);

@@ -25,6 +25,7 @@
 #include "api_lock.h"
 #include "client_entry.h"
 #include "client_process_watcher.h"
+#include "deferred_join.h"
 #include "dump_value.h"
 #include "event_delivery.h"
 #include "event_ring.h"
@@ -40,6 +41,14 @@ namespace binder {
 // Shares the range sensor (mode 3) and the spectral ambient-light sensor (mode 1) between
 // clients. Every binder method and the death handler run wholly under `api_lock_`; sensors are
 // switched only by the two workers, and sampled only by the per-mode processing threads.
+//
+// Delivery threads and the API lock: a version 1 client's notification thread (Enable) is joined
+// under the lock by Disable and Close, so a callback of such a client that waits for the service
+// while another of its threads disables it ends the service through the lock check. A version 2
+// client's delivery thread (EnableOnSample) never is: Disable and Close stop it under the lock
+// and hand it to a DeferredJoin, which joins it after the lock is released and before the method
+// returns (a new enable may start its successor meanwhile); a dead client's thread is joined by
+// FinishRelease, also after the lock. Such a callback holds up only the call that stops it.
 class VYRService : public aidl::android::vyr::BnVYRService {
   public:
     explicit VYRService(const ServiceConfig& config);
@@ -81,12 +90,16 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     ServiceModeParams& ParamsForMode(int32_t mode);
     WorkQueue& QueueForMode(int32_t mode);
 
-    void CloseInternal(int32_t handle) REQUIRES(api_lock_);
+    // Removes the client. The thread of a client enabled on sample goes to `after_unlock`.
+    void CloseInternal(int32_t handle, DeferredJoin* after_unlock) REQUIRES(api_lock_);
     // The one disable path, of Disable and of a client's death. For a dead client
     // (`client_died`) the notification thread is stopped but not joined: the death handler
     // joins it once it has released the API lock, since that thread may be inside OnEvent
-    // waiting for the lock through a nested call.
-    void DisableInternal(int32_t handle, bool client_died) REQUIRES(api_lock_);
+    // waiting for the lock through a nested call. The thread of a live client enabled on sample
+    // is stopped and handed to `after_unlock`, which the method joins after releasing the lock;
+    // a version 1 client's thread is joined here, under the lock.
+    void DisableInternal(int32_t handle, bool client_died, DeferredJoin* after_unlock)
+        REQUIRES(api_lock_);
     void HandleBinderDied(AIBinder* binder) EXCLUDES(api_lock_);
     static void OnBinderDied(void* cookie);
     static void OnDeathLinkUnlinked(void* cookie);
@@ -106,7 +119,8 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // What a client's death does, whichever way it was learnt: the log line, then the shared
     // internal disable and close. The entry goes to `released`, for FinishRelease.
     void ReleaseDeadClient(int32_t handle, const std::string& cause,
-                           std::vector<std::shared_ptr<ClientEntry>>* released) REQUIRES(api_lock_);
+                           std::vector<std::shared_ptr<ClientEntry>>* released,
+                           DeferredJoin* after_unlock) REQUIRES(api_lock_);
     // Joins the notification threads of released clients and drops their callbacks; called
     // without the API lock.
     static void FinishRelease(std::vector<std::shared_ptr<ClientEntry>>* released);

@@ -8,16 +8,24 @@
 //                                      delay) as <name>, prints "registered", serves for good
 //   vyr_doubles_service client <name>  opens a range handle with a callback, enables it at
 //                                      20 ms, prints "handle <h>" and waits to be killed
+//   vyr_doubles_service stuck <name>   the same enabled on sample (version 2), with a callback
+//                                      that never returns: prints "handle <h>" once the service
+//                                      is inside it, "disabling" as another thread calls
+//                                      Disable, and waits to be killed
 
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
 #include <unistd.h>
 
 #include <chrono>
+#include <condition_variable>
 #include <cstdio>
 #include <cstring>
 #include <memory>
+#include <mutex>
 #include <string>
+#include <thread>
+#include <vector>
 
 #include "recording_callback.h"
 #include "sensor_doubles.h"
@@ -69,11 +77,69 @@ int Client(const char* name) {
     for (;;) pause();
 }
 
+// An on-sample callback that never answers.
+class StuckCallback : public aidl::android::vyr::BnEventCallback {
+  public:
+    ndk::ScopedAStatus OnEvent(const aidl::android::vyr::Event& /*event*/) override {
+        Hang();
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus OnEventBatch(const std::vector<aidl::android::vyr::Event>&) override {
+        Hang();
+        return ndk::ScopedAStatus::ok();
+    }
+    ndk::ScopedAStatus OnFlushComplete(int32_t /*handle*/) override {
+        Hang();
+        return ndk::ScopedAStatus::ok();
+    }
+    void WaitUntilCalled() {
+        std::unique_lock<std::mutex> lock(mutex_);
+        changed_.wait(lock, [this] { return called_; });
+    }
+
+  private:
+    void Hang() {
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            called_ = true;
+        }
+        changed_.notify_all();
+        for (;;) pause();
+    }
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    bool called_ = false;
+};
+
+int Stuck(const char* name) {
+    ABinderProcess_startThreadPool();
+    std::shared_ptr<IVYRService> service =
+        IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+    if (service == nullptr) return 2;
+    int32_t handle = 0;
+    int32_t result = 0;
+    auto callback = ndk::SharedRefBase::make<StuckCallback>();
+    if (!service->Open(kRange, &handle).isOk() || handle <= 0) return 3;
+    if (!service->SetCallback(handle, callback, &result).isOk() || result != 0) return 4;
+    if (!service->EnableOnSample(handle, 20, 0, &result).isOk() || result != 0) return 5;
+    callback->WaitUntilCalled();
+    printf("handle %d\n", handle);
+    fflush(stdout);
+    std::thread disabler([service, handle] {
+        printf("disabling\n");
+        fflush(stdout);
+        service->Disable(handle);
+    });
+    disabler.detach();
+    for (;;) pause();
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
-    fprintf(stderr, "usage: %s serve|client <name>\n", argv[0]);
+    if (argc == 3 && strcmp(argv[1], "stuck") == 0) return Stuck(argv[2]);
+    fprintf(stderr, "usage: %s serve|client|stuck <name>\n", argv[0]);
     return 64;
 }

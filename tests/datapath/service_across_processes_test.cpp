@@ -12,6 +12,7 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <stdlib.h>
+#include <sys/wait.h>
 #include <unistd.h>
 #include <vyr/sensor_client.h>
 
@@ -19,10 +20,13 @@
 #include <chrono>
 #include <condition_variable>
 #include <filesystem>
+#include <functional>
+#include <future>
 #include <memory>
 #include <mutex>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include "child_process.h"
 #include "recording_callback.h"
@@ -48,6 +52,27 @@ bool Eventually(Predicate predicate) {
     }
     return true;
 }
+
+// Opened once; waited for with a deadline.
+class Gate {
+  public:
+    void Open() {
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            open_ = true;
+        }
+        changed_.notify_all();
+    }
+    bool Wait(milliseconds timeout) {
+        std::unique_lock<std::mutex> lock(mutex_);
+        return changed_.wait_for(lock, timeout, [this] { return open_; });
+    }
+
+  private:
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    bool open_ = false;
+};
 
 std::string DoublesService() {
 #if defined(VYR_DOUBLES_SERVICE)
@@ -173,7 +198,8 @@ TEST_F(ServiceAcrossProcessesTest, ACallbackGetsTheSamplesPushed) {
 }
 
 // A client that calls the service from its OnEvent (the notification thread waits for the reply
-// meanwhile) is served, and its events go on.
+// meanwhile) is served, and its events go on. Its nested calls end before it disables, as they
+// must for a client enabled with Enable.
 TEST_F(ServiceAcrossProcessesTest, CallsFromOnEventAreServed) {
     const int32_t handle = OpenRange();
     auto callback = ndk::SharedRefBase::make<RecordingCallback>();
@@ -188,9 +214,9 @@ TEST_F(ServiceAcrossProcessesTest, CallsFromOnEventAreServed) {
     ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
     EnableAt(handle, 20);
     EXPECT_TRUE(callback->WaitForEvents(5, kWait));
+    ASSERT_TRUE(callback->StopReacting(kWait));
     ASSERT_TRUE(service_->Disable(handle).isOk());
     ASSERT_TRUE(service_->Close(handle).isOk());
-    callback->SetReaction(nullptr);
     EXPECT_GE(nested_ok.load(), 4);
 }
 
@@ -227,6 +253,214 @@ TEST_F(ServiceAcrossProcessesTest, TheClientLibraryReattachesAcrossARestart) {
     EXPECT_TRUE(listener.WaitForEvents(before + 3)) << "no events from the new instance";
     client.Stop();
     EXPECT_EQ(client.state(), vyr::SensorClient::State::kStopped);
+}
+
+// A client enabled with Enable that calls the service from OnEvent while another of its threads
+// disables the handle: Disable waits for OnEvent under the service's lock, the nested call waits
+// for that lock, and 10 s later the service's lock check ends the service.
+TEST_F(ServiceAcrossProcessesTest, AVersion1NestedCallBesideADisableEndsTheService) {
+    const int32_t handle = OpenRange();
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    Gate disabling;
+    std::atomic<bool> nested_failed{false};
+    std::shared_ptr<IVYRService> service = service_;
+    callback->SetReaction([service, handle, &disabling, &nested_failed](size_t count) {
+        if (count != 1 || !disabling.Wait(kWait)) return;
+        // Calls back until the service can no longer answer.
+        const auto give_up = std::chrono::steady_clock::now() + 3 * kWait;
+        Event event;
+        int32_t result = 0;
+        while (std::chrono::steady_clock::now() < give_up) {
+            if (!service->PollOnce(handle, &event, &result).isOk()) {
+                nested_failed = true;
+                return;
+            }
+            std::this_thread::sleep_for(milliseconds(1));
+        }
+    });
+    int32_t result = -1;
+    ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
+    EnableAt(handle, 20);
+    ASSERT_TRUE(callback->WaitForEvents(1, kWait));
+    auto disabled = std::async(std::launch::async, [&] {
+        disabling.Open();
+        return service->Disable(handle).isOk();
+    });
+    ASSERT_EQ(disabled.wait_for(3 * kWait), std::future_status::ready) << "Disable never returned";
+    EXPECT_FALSE(disabled.get()) << "the service answered Disable";
+    const std::optional<int> status = server_->Wait(kWait);
+    ASSERT_TRUE(status.has_value()) << "the service still runs";
+    EXPECT_TRUE(WIFSIGNALED(*status) && WTERMSIG(*status) == SIGABRT) << "wait status " << *status;
+    EXPECT_TRUE(callback->StopReacting(kWait));
+    EXPECT_TRUE(nested_failed.load());
+}
+
+// Which callback of a client enabled on sample makes the nested calls.
+enum class NestedFrom { kOnEvent, kOnEventBatch, kOnFlushComplete };
+
+class NestedOnSampleTest : public ServiceAcrossProcessesTest,
+                           public ::testing::WithParamInterface<NestedFrom> {
+  protected:
+    // One of the calls that a callback makes back, by `turn`; only its status is asked for.
+    static bool CallBack(IVYRService& service, int32_t handle, int turn) {
+        int32_t result = 0;
+        switch (turn % 3) {
+            case 0: {
+                Event event;
+                return service.PollOnce(handle, &event, &result).isOk();
+            }
+            case 1:
+                return service.EnableLowPower(handle, false, &result).isOk();
+            default:
+                return service.ConfigureParameters(handle, std::vector<int32_t>(11, 1), &result)
+                    .isOk();
+        }
+    }
+
+    // Enables `handle` on sample so that the callback under test runs, setting `react` as its
+    // reaction.
+    void EnableSoThatItRuns(int32_t handle, RecordingCallback& callback,
+                            const std::function<void()>& react) {
+        int32_t result = -1;
+        switch (GetParam()) {
+            case NestedFrom::kOnEvent:
+                callback.SetReaction([react](size_t /*count*/) { react(); });
+                ASSERT_TRUE(service_->EnableOnSample(handle, 1, 0, &result).isOk());
+                ASSERT_EQ(result, 0);
+                break;
+            case NestedFrom::kOnEventBatch:
+                callback.SetBatchReaction(react);
+                ASSERT_TRUE(service_->EnableOnSample(handle, 1, 5, &result).isOk());
+                ASSERT_EQ(result, 0);
+                break;
+            case NestedFrom::kOnFlushComplete:
+                callback.SetFlushReaction(react);
+                ASSERT_TRUE(service_->EnableOnSample(handle, 1, 60000, &result).isOk());
+                ASSERT_EQ(result, 0);
+                ASSERT_TRUE(service_->Flush(handle, &result).isOk());
+                ASSERT_EQ(result, 0);
+                break;
+        }
+    }
+};
+
+// A version 2 callback that calls back while another thread of its client disables and closes
+// the handle holds only that client's calls: the service never waits for it under its lock, and
+// a second client is served all along.
+TEST_P(NestedOnSampleTest, NestedCallsBesideADisableAndCloseAreServed) {
+    const int32_t other = OpenRange();
+    std::shared_ptr<IVYRService> service = service_;
+    for (int round = 0; round < 50; ++round) {
+        SCOPED_TRACE("round " + std::to_string(round));
+        const int32_t handle = OpenRange();
+        auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+        int32_t result = -1;
+        ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
+        Gate entered;
+        Gate disabling;
+        std::atomic<bool> first{true};
+        std::atomic<int> nested_failures{0};
+        EnableSoThatItRuns(handle, *callback, [&, handle, round] {
+            if (!first.exchange(false)) return;
+            entered.Open();
+            if (!disabling.Wait(kWait)) return;
+            // Calls back for a while beside the Disable.
+            const auto until = std::chrono::steady_clock::now() + milliseconds(20);
+            int turn = round;
+            do {
+                if (!CallBack(*service, handle, turn++)) ++nested_failures;
+            } while (std::chrono::steady_clock::now() < until);
+        });
+        ASSERT_TRUE(entered.Wait(kWait)) << "the callback never ran";
+        auto released = std::async(std::launch::async, [&] {
+            disabling.Open();
+            return service->Disable(handle).isOk() && service->Close(handle).isOk();
+        });
+        // The other client meanwhile.
+        int turn = round;
+        while (released.wait_for(milliseconds(1)) != std::future_status::ready) {
+            ASSERT_TRUE(CallBack(*service, other, turn++)) << "the second client was refused";
+            ASSERT_TRUE(server_->Running()) << "the service ended";
+        }
+        EXPECT_TRUE(released.get()) << "Disable or Close failed";
+        EXPECT_TRUE(callback->StopReacting(kWait));
+        EXPECT_EQ(nested_failures.load(), 0);
+    }
+    EXPECT_NE(Poll(other), -EINVAL) << "the second client is still open";
+    ASSERT_TRUE(server_->Running());
+}
+
+INSTANTIATE_TEST_SUITE_P(EveryCallback, NestedOnSampleTest,
+                         ::testing::Values(NestedFrom::kOnEvent, NestedFrom::kOnEventBatch,
+                                           NestedFrom::kOnFlushComplete),
+                         [](const ::testing::TestParamInfo<NestedFrom>& info) {
+                             switch (info.param) {
+                                 case NestedFrom::kOnEvent:
+                                     return std::string("OnEvent");
+                                 case NestedFrom::kOnEventBatch:
+                                     return std::string("OnEventBatch");
+                                 default:
+                                     return std::string("OnFlushComplete");
+                             }
+                         });
+
+// A version 2 callback that takes 15 s while its client disables: only that Disable waits, and
+// the service, which would end itself after 10 s of waiting for its lock, serves a second client
+// throughout.
+TEST_F(ServiceAcrossProcessesTest, ASlowOnSampleCallbackHoldsOnlyItsOwnDisable) {
+    const int32_t other = OpenRange();
+    const int32_t handle = OpenRange();
+    auto callback = ndk::SharedRefBase::make<RecordingCallback>();
+    callback->SetReaction([](size_t count) {
+        if (count == 1) std::this_thread::sleep_for(std::chrono::seconds(15));
+    });
+    int32_t result = -1;
+    ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
+    ASSERT_TRUE(service_->EnableOnSample(handle, 20, 0, &result).isOk());
+    ASSERT_EQ(result, 0);
+    ASSERT_TRUE(callback->WaitForEvents(1, kWait));
+    std::shared_ptr<IVYRService> service = service_;
+    auto released = std::async(std::launch::async, [service, handle] {
+        return service->Disable(handle).isOk() && service->Close(handle).isOk();
+    });
+    int turn = 0;
+    while (released.wait_for(milliseconds(10)) != std::future_status::ready) {
+        Event event;
+        ASSERT_TRUE(service_->PollOnce(other, &event, &result).isOk())
+            << "the second client was refused at call " << turn;
+        ++turn;
+    }
+    EXPECT_TRUE(released.get());
+    EXPECT_TRUE(callback->StopReacting(kWait));
+    EXPECT_TRUE(server_->Running());
+    EXPECT_NE(Poll(other), -EINVAL);
+}
+
+// A version 2 callback that never answers: its client's Disable waits, nothing else does, and the
+// client's death releases its handle.
+TEST_F(ServiceAcrossProcessesTest, AnOnSampleCallbackThatNeverAnswersHoldsOnlyItsOwnClient) {
+    ChildProcess client({DoublesService(), "stuck", name_}, {}, dir_ + "/stuck.log");
+    std::optional<std::string> line = client.ReadLineStartingWith("handle ", kWait);
+    ASSERT_TRUE(line) << "the service never called the client";
+    const int32_t handle = atoi(line->c_str() + 7);
+    ASSERT_TRUE(client.ReadLineStartingWith("disabling", kWait));
+    const int32_t other = OpenRange();
+    // Longer than the service would wait for its lock before ending itself.
+    const auto until = std::chrono::steady_clock::now() + kWait + std::chrono::seconds(1);
+    int32_t result = 0;
+    int turn = 0;
+    while (std::chrono::steady_clock::now() < until) {
+        Event event;
+        ASSERT_TRUE(service_->PollOnce(other, &event, &result).isOk())
+            << "the second client was refused at call " << turn;
+        ++turn;
+        std::this_thread::sleep_for(milliseconds(10));
+    }
+    client.Signal(SIGKILL);
+    ASSERT_TRUE(client.Wait(kWait));
+    EXPECT_TRUE(Eventually([&] { return Poll(handle) == -EINVAL; })) << "the handle outlived it";
+    EXPECT_TRUE(server_->Running());
+    ASSERT_TRUE(service_->Close(other).isOk());
 }
 
 }  // namespace

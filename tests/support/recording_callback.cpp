@@ -7,6 +7,17 @@
 
 namespace vyr_test {
 
+template <typename Reaction, typename... Args>
+void RecordingCallback::React(const Reaction& reaction, Args... args) {
+    if (!reaction) return;
+    reaction(args...);
+    {
+        std::lock_guard<std::mutex> lock(mutex_);
+        --reacting_;
+    }
+    changed_.notify_all();
+}
+
 ndk::ScopedAStatus RecordingCallback::OnEvent(const aidl::android::vyr::Event& event) {
     std::function<void(size_t)> reaction;
     size_t count;
@@ -15,30 +26,39 @@ ndk::ScopedAStatus RecordingCallback::OnEvent(const aidl::android::vyr::Event& e
         events_.push_back(event);
         count = events_.size();
         reaction = reaction_;
+        if (reaction) ++reacting_;
     }
     changed_.notify_all();
-    if (reaction) reaction(count);
+    React(reaction, count);
     if (failing_.load()) return ndk::ScopedAStatus::fromStatus(STATUS_UNKNOWN_ERROR);
     return ndk::ScopedAStatus::ok();
 }
 
 ndk::ScopedAStatus RecordingCallback::OnEventBatch(
     const std::vector<aidl::android::vyr::Event>& events) {
+    std::function<void()> reaction;
     {
         std::lock_guard<std::mutex> lock(mutex_);
         events_.insert(events_.end(), events.begin(), events.end());
         batch_sizes_.push_back(events.size());
+        reaction = batch_reaction_;
+        if (reaction) ++reacting_;
     }
     changed_.notify_all();
+    React(reaction);
     return ndk::ScopedAStatus::ok();
 }
 
 ndk::ScopedAStatus RecordingCallback::OnFlushComplete(int32_t) {
+    std::function<void()> reaction;
     {
         std::lock_guard<std::mutex> lock(mutex_);
         flushes_.push_back(events_.size());
+        reaction = flush_reaction_;
+        if (reaction) ++reacting_;
     }
     changed_.notify_all();
+    React(reaction);
     return ndk::ScopedAStatus::ok();
 }
 
@@ -65,6 +85,24 @@ bool RecordingCallback::WaitForFlushes(size_t count, std::chrono::milliseconds t
 void RecordingCallback::SetReaction(std::function<void(size_t count)> reaction) {
     std::lock_guard<std::mutex> lock(mutex_);
     reaction_ = std::move(reaction);
+}
+
+void RecordingCallback::SetBatchReaction(std::function<void()> reaction) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    batch_reaction_ = std::move(reaction);
+}
+
+void RecordingCallback::SetFlushReaction(std::function<void()> reaction) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    flush_reaction_ = std::move(reaction);
+}
+
+bool RecordingCallback::StopReacting(std::chrono::milliseconds timeout) {
+    std::unique_lock<std::mutex> lock(mutex_);
+    reaction_ = nullptr;
+    batch_reaction_ = nullptr;
+    flush_reaction_ = nullptr;
+    return changed_.wait_for(lock, timeout, [&] { return reacting_ == 0; });
 }
 
 std::vector<aidl::android::vyr::Event> RecordingCallback::Events() {

@@ -39,8 +39,19 @@ class RecordingCallback : public aidl::android::vyr::BnEventCallback {
     // Runs inside OnEvent, on the caller's thread, after the event is recorded, with the number
     // of events so far: what a client does from its callback.
     void SetReaction(std::function<void(size_t count)> reaction);
+    // The same inside OnEventBatch and OnFlushComplete, after what they carry is recorded.
+    void SetBatchReaction(std::function<void()> reaction);
+    void SetFlushReaction(std::function<void()> reaction);
+    // Clears every reaction and waits until none is running: what a client does before it
+    // disables or closes its handle from another thread, so that no nested call is left to wait
+    // for the service while the service waits for the callback. False on time-out.
+    bool StopReacting(std::chrono::milliseconds timeout);
 
   private:
+    // Runs `reaction` (if any) counted as running, so that StopReacting can wait for it.
+    template <typename Reaction, typename... Args>
+    void React(const Reaction& reaction, Args... args);
+
     std::mutex mutex_;
     std::condition_variable changed_;
     std::vector<aidl::android::vyr::Event> events_;
@@ -48,6 +59,9 @@ class RecordingCallback : public aidl::android::vyr::BnEventCallback {
     std::vector<size_t> flushes_;
     std::atomic<bool> failing_{false};
     std::function<void(size_t)> reaction_;
+    std::function<void()> batch_reaction_;
+    std::function<void()> flush_reaction_;
+    int reacting_ = 0;
 };
 
 }  // namespace vyr_test

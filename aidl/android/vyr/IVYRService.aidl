@@ -63,6 +63,10 @@ interface IVYRService {
     // stored (every k-th one, k = max(1, round(period / active period))) with no timer of its
     // own. With maxReportLatency > 0 (milliseconds) samples are held up to that long and handed
     // over together through OnEventBatch, which a version 1 callback lacks (-95).
+    // The delivery thread of a handle enabled this way is stopped under the service's lock by
+    // Disable, Close or the client's death, and waited for after the lock is released: a callback
+    // that calls back, is slow or never answers holds only the call that stops it (until it
+    // returns or its process dies), never another client's call.
     int EnableOnSample(int handle, int period, int maxReportLatency);
     // Version 2. Delivers what is held for the handle at once, then calls OnFlushComplete.
     int Flush(int handle);
