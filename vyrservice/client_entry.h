@@ -18,7 +18,7 @@
 #include <utility>
 
 #include "client_process_watcher.h"
-#include "sample_signal.h"
+#include "sample_queue.h"
 
 namespace android {
 namespace vyr {
@@ -75,8 +75,9 @@ struct ClientEntry {
     std::atomic<uint64_t> notify_generation{0};
     std::unique_ptr<std::condition_variable> notify_cv;
     std::unique_ptr<std::mutex> notify_mutex;
-    // Wakes the thread of a client enabled on sample with a callback; null otherwise.
-    std::shared_ptr<SampleSignal> sample_signal;
+    // The samples on their way to the thread of a client enabled on sample with a callback; null
+    // otherwise.
+    std::shared_ptr<SampleQueue> sample_queue;
     // Held strongly: an in-process callback keeps only a weak reference to its own binder.
     ndk::SpAIBinder callback_binder;
     AIBinder_DeathRecipient* death_recipient = nullptr;
@@ -95,6 +96,10 @@ struct ClientEntry {
     // For the dump: events handed to the callback, and polls answered with no new sample.
     std::atomic<uint64_t> events_delivered{0};
     std::atomic<uint64_t> polls_refused{0};
+    // For the dump: samples that a client enabled on sample lost on the way (its queues count
+    // them, also after the client's thread was stopped).
+    const std::shared_ptr<std::atomic<uint64_t>> samples_dropped =
+        std::make_shared<std::atomic<uint64_t>>(0);
 };
 
 }  // namespace binder

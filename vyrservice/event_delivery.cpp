@@ -19,8 +19,9 @@
 #include <utility>
 #include <vector>
 
+#include "batch_sender.h"
 #include "event_conversion.h"
-#include "sample_signal.h"
+#include "sample_queue.h"
 #include "sensor_modes.h"
 
 namespace android {
@@ -30,11 +31,30 @@ namespace binder {
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 
+namespace {
+
+// Replaces `event` with the sample of `mode`, as PollOnce returns it.
+void ConvertSample(int32_t mode, const QueuedSample& sample, Event* event) {
+    Event local{};
+    if (mode == kRangeMode) {
+        ConvertRangingData(sample.range, &local);
+    } else {
+        ConvertAlsResult(sample.als, &local);
+    }
+    event->status = local.status;
+    event->timestamp = local.timestamp;
+    event->value0 = local.value0;
+    event->value1 = local.value1;
+    event->data = std::move(local.data);
+    event->boottime = sample.boottime_ns;
+}
+
+}  // namespace
+
 EventDelivery::EventDelivery(ParamsForMode params_for_mode)
     : params_for_mode_(std::move(params_for_mode)) {}
 
 bool EventDelivery::PollInternal(int32_t handle, int32_t mode, Event* event) {
-    Event local{};
     if (mode != kRangeMode && mode != kAlsMode) {
         ALOGE("%s, invalid mode", __func__);
         return false;
@@ -47,39 +67,23 @@ bool EventDelivery::PollInternal(int32_t handle, int32_t mode, Event* event) {
         }
     }
     // A sample published between the test above and this section is the one taken.
-    ALSResult als_data{};
-    MultiRangingData range_data{};
-    int64_t boottime_ns = 0;
+    QueuedSample sample;
     {
         std::lock_guard<std::mutex> lock(params->data_mutex);
         params->polled_handles.insert(handle);
         if (mode == kRangeMode) {
-            range_data = params->range_data;
+            sample.range = params->range_data;
         } else {
-            als_data = params->als_data;
+            sample.als = params->als_data;
         }
-        boottime_ns = params->boottime_ns;
+        sample.boottime_ns = params->boottime_ns;
     }
     // Converted outside the lock so that the processing loop waits for one copy at most.
-    if (mode == kRangeMode) {
-        if (range_data.valid == 0) {
-            ALOGW("%s, invalid data", __func__);
-            return false;
-        }
-        ConvertRangingData(range_data, &local);
-    } else {
-        if (als_data.valid == 0) {
-            ALOGW("%s, invalid data", __func__);
-            return false;
-        }
-        ConvertAlsResult(als_data, &local);
+    if ((mode == kRangeMode ? sample.range.valid : sample.als.valid) == 0) {
+        ALOGW("%s, invalid data", __func__);
+        return false;
     }
-    event->status = local.status;
-    event->timestamp = local.timestamp;
-    event->value0 = local.value0;
-    event->value1 = local.value1;
-    event->data = std::move(local.data);
-    event->boottime = boottime_ns;
+    ConvertSample(mode, sample, event);
     return true;
 }
 
@@ -87,20 +91,21 @@ void EventDelivery::Start(int32_t handle, const std::shared_ptr<ClientEntry>& en
     const uint64_t generation = ++entry->notify_generation;
     entry->notify_cv = std::make_unique<std::condition_variable>();
     entry->notify_mutex = std::make_unique<std::mutex>();
-    entry->sample_signal.reset();
+    entry->sample_queue.reset();
     if (entry->on_sample && entry->callback) {
-        entry->sample_signal = std::make_shared<SampleSignal>();
+        entry->sample_queue =
+            std::make_shared<SampleQueue>(handle, entry->period, entry->samples_dropped);
     }
     entry->state = kClientEnabled;
     if (!entry->callback) {
         return;
     }
-    if (entry->sample_signal) {
+    if (entry->sample_queue) {
         // Subscribed before the thread starts: no sample stored after Enable returned is missed.
-        Subscribe(entry->mode, entry->sample_signal);
+        Subscribe(entry->mode, entry->sample_queue);
         OnSampleClient client{
-            handle,     entry->mode,     entry->period,       entry->max_report_latency,
-            generation, entry->callback, entry->sample_signal};
+            handle,     entry->mode,     entry->period,      entry->max_report_latency,
+            generation, entry->callback, entry->sample_queue};
         entry->notify_thread = std::make_unique<std::thread>(&EventDelivery::SampleLoop, this,
                                                              entry, std::move(client));
     } else {
@@ -109,23 +114,38 @@ void EventDelivery::Start(int32_t handle, const std::shared_ptr<ClientEntry>& en
     }
 }
 
-void EventDelivery::SampleStored(const std::vector<std::shared_ptr<SampleSignal>>& signals) {
-    for (const std::shared_ptr<SampleSignal>& signal : signals) {
-        signal->Publish();
+void EventDelivery::SampleStored(ServiceModeParams& params) {
+    // Held by the caller; GCC cannot parse an annotation that names an argument's member.
+    android::base::ScopedLockAssertion held(params.data_mutex);
+    if (params.sample_queues.empty()) return;
+    const int32_t mode = params.mode;
+    QueuedSample sample;
+    if (mode == kRangeMode) {
+        if (params.range_data.valid == 0) return;
+        sample.range = params.range_data;
+    } else {
+        if (params.als_data.valid == 0) return;
+        sample.als = params.als_data;
+    }
+    sample.boottime_ns = params.boottime_ns;
+    const int32_t active_period = params.active_period;
+    const auto now = std::chrono::steady_clock::now();
+    for (const std::shared_ptr<SampleQueue>& queue : params.sample_queues) {
+        if (queue->Offer(sample, active_period, now)) params.polled_handles.insert(queue->handle());
     }
 }
 
-void EventDelivery::Subscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal) {
+void EventDelivery::Subscribe(int32_t mode, const std::shared_ptr<SampleQueue>& queue) {
     ServiceModeParams& params = params_for_mode_(mode);
     std::lock_guard<std::mutex> lock(params.data_mutex);
-    params.sample_signals.push_back(signal);
+    params.sample_queues.push_back(queue);
 }
 
-void EventDelivery::Unsubscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal) {
+void EventDelivery::Unsubscribe(int32_t mode, const std::shared_ptr<SampleQueue>& queue) {
     ServiceModeParams& params = params_for_mode_(mode);
     std::lock_guard<std::mutex> lock(params.data_mutex);
-    auto& signals = params.sample_signals;
-    signals.erase(std::remove(signals.begin(), signals.end(), signal), signals.end());
+    auto& queues = params.sample_queues;
+    queues.erase(std::remove(queues.begin(), queues.end(), queue), queues.end());
 }
 
 void EventDelivery::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entry,
@@ -170,74 +190,70 @@ void EventDelivery::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entr
     }
 }
 
-namespace {
-
-// Every k-th sample for a client slower than the mode: k = max(1, round(period / active)).
-uint64_t SampleStride(int32_t client_period, int32_t active_period) {
-    if (active_period < 1) return 1;
-    const double ratio = static_cast<double>(client_period) / active_period;
-    return std::max<uint64_t>(1, static_cast<uint64_t>(std::llround(ratio)));
-}
-
-}  // namespace
-
 void EventDelivery::SampleLoop(std::shared_ptr<ClientEntry> entry, OnSampleClient client) {
     const uint64_t generation = client.generation;
     const auto enabled = [&entry, generation] {
         return entry->state == kClientEnabled && entry->notify_generation == generation;
     };
     const int32_t handle = client.handle;
-    const int32_t mode = client.mode;
-    const int32_t period = client.period;
     const std::chrono::milliseconds latency(client.max_report_latency);
-    ServiceModeParams& params = params_for_mode_(mode);
-    const std::shared_ptr<IEventCallback>& callback = client.callback;
-    SampleSignal* const signal = client.signal.get();
+    IEventCallback& callback = *client.callback;
+    SampleQueue& queue = *client.queue;
 
-    SampleSignal::Seen seen;
-    uint64_t taken_at = 0;
     std::vector<Event> held;
+    size_t held_bytes = 0;
     std::chrono::steady_clock::time_point held_since;
-    while (enabled()) {
+    uint64_t flushes_due = 0;
+    bool dead = false;
+    const auto hand_over = [&] {
+        if (held.empty()) return;
+        const BatchResult result = SendBatch(callback, held);
+        entry->events_delivered += result.delivered;
+        if (result.dropped != 0) {
+            queue.CountDropped(result.dropped);
+            ALOGE("OnEventBatch handle %d: %zu events refused even one by one are dropped", handle,
+                  result.dropped);
+        }
+        dead = result.dead;
+        held.clear();
+        held_bytes = 0;
+    };
+    while (!dead) {
         std::optional<std::chrono::steady_clock::time_point> deadline;
         if (!held.empty()) deadline = held_since + latency;
-        const SampleSignal::Seen now = signal->Wait(seen, deadline);
-        if (now.stopped || !enabled()) {
-            break;
-        }
-        // The active period is read at each sample, so a change of it changes k at once.
-        if (now.samples != seen.samples &&
-            now.samples - taken_at >= SampleStride(period, params.active_period)) {
-            Event event{};
-            if (PollInternal(handle, mode, &event)) {
-                taken_at = now.samples;
-                if (latency.count() == 0) {
-                    ATRACE_BEGIN("vyr deliver");
-                    callback->OnEvent(event);
-                    ATRACE_END();
-                    ++entry->events_delivered;
-                } else {
-                    if (held.empty()) held_since = std::chrono::steady_clock::now();
-                    held.push_back(std::move(event));
-                }
+        SampleQueue::Taken taken = queue.Take(deadline);
+        const bool stopping = taken.stopped || !enabled();
+        flushes_due += taken.flushes;
+        // What a stopped client held goes with it, unless a Flush promised to deliver it.
+        if (stopping && flushes_due == 0) break;
+        for (const QueuedSample& sample : taken.samples) {
+            Event event;
+            ConvertSample(client.mode, sample, &event);
+            if (latency.count() == 0) {
+                ATRACE_BEGIN("vyr deliver");
+                dead = callback.OnEvent(event).getStatus() == STATUS_DEAD_OBJECT;
+                ATRACE_END();
+                if (dead) break;
+                ++entry->events_delivered;
+                continue;
             }
+            const size_t bytes = BatchBytes(event);
+            if (kBatchHeaderBytes + held_bytes + bytes > kBatchBudgetBytes) hand_over();
+            if (held.empty()) held_since = std::chrono::steady_clock::now();
+            held.push_back(std::move(event));
+            held_bytes += bytes;
         }
-        // Each Flush gets its own completion, also when two came before this thread woke.
-        const uint64_t flushes = now.flushes - seen.flushes;
-        seen = now;
-        if (!held.empty() &&
-            (flushes != 0 || std::chrono::steady_clock::now() >= held_since + latency)) {
-            ATRACE_BEGIN("vyr deliver batch");
-            callback->OnEventBatch(held);
-            ATRACE_END();
-            entry->events_delivered += held.size();
-            held.clear();
+        if (flushes_due != 0 || stopping ||
+            (!held.empty() && std::chrono::steady_clock::now() >= held_since + latency)) {
+            hand_over();
         }
-        for (uint64_t i = 0; i < flushes && enabled(); ++i) {
-            callback->OnFlushComplete(handle);
+        // Each Flush gets its own completion, after everything queued before it.
+        for (; flushes_due != 0 && !dead; --flushes_due) {
+            dead = callback.OnFlushComplete(handle).getStatus() == STATUS_DEAD_OBJECT;
         }
+        if (stopping) break;
     }
-    Unsubscribe(mode, client.signal);
+    Unsubscribe(client.mode, client.queue);
 }
 
 }  // namespace binder

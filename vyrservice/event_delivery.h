@@ -20,7 +20,7 @@ namespace binder {
 
 // Hands the samples of the mode blocks to clients, each sample at most once per handle: by poll,
 // by the version 1 timer loop (a client's own period), and by the version 2 delivery on sample
-// (woken by the processing loop, every k-th sample, optionally held for a report latency).
+// (every k-th sample queued by the processing loop, optionally held for a report latency).
 class EventDelivery {
   public:
     using ParamsForMode = std::function<ServiceModeParams&(int32_t mode)>;
@@ -37,9 +37,10 @@ class EventDelivery {
     // and never touches the objects being replaced.
     void Start(int32_t handle, const std::shared_ptr<ClientEntry>& entry);
 
-    // Called by the processing loop as it stores a sample, with the block's data_mutex held and
-    // its `sample_signals`: wakes the clients enabled on sample.
-    static void SampleStored(const std::vector<std::shared_ptr<SampleSignal>>& signals);
+    // Called by the processing loop as it stores a sample, with the block's data_mutex held:
+    // queues a valid sample for each client enabled on sample whose stride takes it, which has
+    // then taken it (a poll of that handle does not return it again).
+    static void SampleStored(ServiceModeParams& params);
 
   private:
     // Version 1: polls once per client period.
@@ -54,12 +55,15 @@ class EventDelivery {
         int32_t max_report_latency = 0;
         uint64_t generation = 0;
         std::shared_ptr<aidl::android::vyr::IEventCallback> callback;
-        std::shared_ptr<SampleSignal> signal;
+        std::shared_ptr<SampleQueue> queue;
     };
-    // Version 2: woken by each stored sample; no timer but the report latency's.
+    // Version 2: drains the client's queue; no timer but the report latency's. Held events are
+    // handed over when the latency has passed, when they reach kBatchBudgetBytes, and at a Flush.
+    // Once stopped it ends at once, unless a Flush answered 0 is still due: then it delivers what
+    // was queued and held, and completes each such Flush, first.
     void SampleLoop(std::shared_ptr<ClientEntry> entry, OnSampleClient client);
-    void Subscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal);
-    void Unsubscribe(int32_t mode, const std::shared_ptr<SampleSignal>& signal);
+    void Subscribe(int32_t mode, const std::shared_ptr<SampleQueue>& queue);
+    void Unsubscribe(int32_t mode, const std::shared_ptr<SampleQueue>& queue);
 
     const ParamsForMode params_for_mode_;
 };

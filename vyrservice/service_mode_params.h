@@ -16,7 +16,7 @@
 #include <vector>
 
 #include "ambient_light_sensor.h"
-#include "sample_signal.h"
+#include "sample_queue.h"
 #include "ubk/range_sensor.h"
 
 namespace android {
@@ -43,8 +43,9 @@ struct ServiceModeParams {
     std::set<int32_t> polled_handles GUARDED_BY(data_mutex);
     // When the sensor library returned the stored sample, CLOCK_BOOTTIME nanoseconds.
     int64_t boottime_ns GUARDED_BY(data_mutex) = 0;
-    // The clients enabled on sample with a callback, woken as each sample is stored.
-    std::vector<std::shared_ptr<SampleSignal>> sample_signals GUARDED_BY(data_mutex);
+    // The queues of the clients enabled on sample with a callback, offered each sample as it is
+    // stored.
+    std::vector<std::shared_ptr<SampleQueue>> sample_queues GUARDED_BY(data_mutex);
     std::mutex data_mutex;
     // For the dump, written by the processing loop: samples stored, those marked invalid, and
     // when the last one was stored (steady clock, 0 before the first).

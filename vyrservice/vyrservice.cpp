@@ -49,6 +49,10 @@ constexpr int32_t kDisplayPeriodMs = 1000;
 constexpr int32_t kLowPowerWakeMarginMs = 90;
 constexpr size_t kControlSettingsCount = 11;
 constexpr size_t kDisplayStateBufferSize = 50;
+// The longest that samples may be held for a client enabled on sample. A batch is handed over
+// earlier when it reaches its byte budget, so this bounds how stale a held sample can get at low
+// rates, not the memory it takes.
+constexpr int32_t kMaxReportLatencyMs = 60000;
 
 // A call that waits this long for another one ends the service: something is stuck for good.
 #define LOCK_API()                                         \
@@ -315,7 +319,8 @@ ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
     std::shared_ptr<ClientEntry> target = EnableTarget(__func__, handle, result);
     if (target == nullptr) return Ok();
     ClientEntry& entry = *target;
-    if (max_report_latency < 0 || (max_report_latency > 0 && !entry.callback)) {
+    if (max_report_latency < 0 || max_report_latency > kMaxReportLatencyMs ||
+        (max_report_latency > 0 && !entry.callback)) {
         ALOGE("%s handle %d: invalid max report latency %d", __func__, handle, max_report_latency);
         *result = -EINVAL;
         return Ok();
@@ -380,7 +385,7 @@ ndk::ScopedAStatus VYRService::Flush(int32_t handle, int32_t* result) {
     }
     ClientEntry& entry = *it->second;
     NoteCaller(&entry);
-    if (entry.state != kClientEnabled || !entry.sample_signal) {
+    if (entry.state != kClientEnabled || !entry.sample_queue) {
         ALOGE("%s handle %d is not enabled on sample with a callback", __func__, handle);
         *result = -EINVAL;
         return Ok();
@@ -391,7 +396,7 @@ ndk::ScopedAStatus VYRService::Flush(int32_t handle, int32_t* result) {
         *result = -EOPNOTSUPP;
         return Ok();
     }
-    entry.sample_signal->Flush();
+    entry.sample_queue->Flush();
     *result = 0;
     return Ok();
 }
@@ -808,7 +813,7 @@ void VYRService::ProcessLoop(ServiceModeParams* params) {
                 params->range_data = data;
             }
             params->polled_handles.clear();
-            EventDelivery::SampleStored(params->sample_signals);
+            EventDelivery::SampleStored(*params);
             ++params->samples;
             if ((mode == kAlsMode ? reading.valid : data.valid) == 0) ++params->invalid_samples;
             params->last_sample_ns = std::chrono::duration_cast<std::chrono::nanoseconds>(

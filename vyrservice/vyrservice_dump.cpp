@@ -160,6 +160,8 @@ DumpValue VYRService::DumpClientsLocked() const {
         client.Set("unwatched_user", entry->unwatched_user);
         client.Set("events_delivered", entry->events_delivered.load());
         client.Set("polls_refused", entry->polls_refused.load());
+        client.Set("on_sample", entry->on_sample);
+        client.Set("samples_dropped", entry->samples_dropped->load());
     }
     return clients;
 }

@@ -5,7 +5,8 @@
 // cross-process suite starts beside itself, on the host and on a device alike.
 //
 //   vyr_doubles_service serve <name>   registers a VYRService (range sensor only, no start-up
-//                                      delay) as <name>, prints "registered", serves for good
+//                                      delay) as <name>, prints "registered", serves for good;
+//                                      its range frames are numbered by their time_ms
 //   vyr_doubles_service client <name>  opens a range handle with a callback, enables it at
 //                                      20 ms, prints "handle <h>" and waits to be killed
 //   vyr_doubles_service stuck <name>   the same enabled on sample (version 2), with a callback
@@ -39,14 +40,19 @@ using android::vyr::binder::ServiceConfig;
 using android::vyr::binder::VYRService;
 
 constexpr int32_t kRange = 3;
+constexpr uint32_t kNumberedFrames = 60000;
 
 int Serve(const char* name) {
-    // A valid one-zone frame at every read.
+    // Valid one-zone frames numbered 1, 2, ... by their sensor time (a minute's worth at 1 ms),
+    // so that a client can tell a lost or repeated sample; the last one after that.
     MultiRangingData frame{};
-    frame.time_ms = 1;
     frame.zone_count = 1;
     frame.zones[0].distance_mm = 500;
     frame.valid = 1;
+    for (uint32_t time_ms = 1; time_ms <= kNumberedFrames; ++time_ms) {
+        frame.time_ms = time_ms;
+        sensor_doubles::QueueRangeData(frame);
+    }
     sensor_doubles::SetRangeData(frame);
     ServiceConfig config;
     // The properties' defaults: the range sensor only, and so no display monitor.

@@ -84,10 +84,10 @@ const char* InProcessServiceTest::ReadCallOf(int32_t mode) {
     return mode == kRange ? sensor_doubles::kRangeProcess : sensor_doubles::kAlsReadSingleShot;
 }
 
-void InProcessServiceTest::StartHeldSampling(int32_t handle, int32_t mode) {
+void InProcessServiceTest::StartHeldSampling(int32_t handle, int32_t mode, int32_t period_ms) {
     held_call_ = ReadCallOf(mode);
     sensor_doubles::Hold(held_call_);
-    EnableOk(handle, 1);
+    EnableOk(handle, period_ms);
     ASSERT_TRUE(sensor_doubles::WaitUntilHeld(held_call_, kWait));
     PublishNextSample();
 }

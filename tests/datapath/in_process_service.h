@@ -50,10 +50,10 @@ class InProcessServiceTest : public vyr_test::ServiceFixture {
     void DisableNow(int32_t handle);
     int32_t Poll(int32_t handle, aidl::android::vyr::Event* event);
 
-    // Holds the sensor read of `mode`, enables `handle` (of that mode) at 1 ms and lets exactly
-    // one sample through: afterwards that sample is stored and the next read is held, so nothing
-    // replaces it until PublishNextSample.
-    void StartHeldSampling(int32_t handle, int32_t mode);
+    // Holds the sensor read of `mode`, enables `handle` (of that mode) at `period_ms` and lets
+    // exactly one sample through: afterwards that sample is stored and the next read is held, so
+    // nothing replaces it until PublishNextSample.
+    void StartHeldSampling(int32_t handle, int32_t mode, int32_t period_ms = 1);
     // Lets exactly one more sample of the held mode through.
     void PublishNextSample();
     // Waits until both mode blocks have no enable in force and no sampling thread.

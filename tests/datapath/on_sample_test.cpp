@@ -4,15 +4,22 @@
 // Version 2's delivery on sample: each k-th stored sample pushed at once, batches held for a
 // maximum report latency, Flush, and the end of such a client by Disable or death.
 
+#include <android/binder_parcel.h>
+#include <android/binder_parcel_utils.h>
 #include <android/log.h>
 #include <time.h>
 
+#include <atomic>
 #include <chrono>
+#include <future>
+#include <nlohmann/json.hpp>
 #include <set>
+#include <string>
 #include <thread>
 #include <vector>
 
 #include "in_process_service.h"
+#include "service_dump.h"
 #include "thread_count.h"
 
 namespace vyr_datapath {
@@ -22,13 +29,44 @@ using aidl::android::vyr::Event;
 using std::chrono::milliseconds;
 
 constexpr size_t kRangeBlock = 2;
-// Long enough that no batch falls due on its own during a test.
-constexpr int32_t kNeverDue = 600000;
+// The longest latency there is: no batch falls due on its own during a test.
+constexpr int32_t kNeverDue = 60000;
+// What a batch may take in a parcel.
+constexpr size_t kBatchBudgetBytes = 128 * 1024;
 
 int64_t BootTimeNs() {
     timespec now{};
     clock_gettime(CLOCK_BOOTTIME, &now);
     return int64_t{now.tv_sec} * 1000000000 + now.tv_nsec;
+}
+
+// Range frames numbered `first`, `first` + 1, ... by their sensor time, with `zones` zones,
+// queued for the reads to come.
+void QueueNumberedFrames(uint32_t first, uint32_t count, uint8_t zones) {
+    for (uint32_t t = first; t < first + count; ++t) {
+        MultiRangingData frame = RangeFrame(t);
+        frame.zone_count = zones;
+        sensor_doubles::QueueRangeData(frame);
+    }
+}
+
+// Whether `events` are consecutive frames, each once, in order.
+::testing::AssertionResult Consecutive(const std::vector<Event>& events) {
+    for (size_t i = 0; i < events.size(); ++i) {
+        if (events[i].timestamp != events[0].timestamp + static_cast<int64_t>(i)) {
+            return ::testing::AssertionFailure()
+                   << "event " << i << " is frame " << events[i].timestamp << " after frame "
+                   << events[0].timestamp;
+        }
+    }
+    return ::testing::AssertionSuccess();
+}
+
+// What `events` take in a parcel, as OnEventBatch sends them.
+size_t ParcelBytes(const std::vector<Event>& events) {
+    ndk::ScopedAParcel parcel(AParcel_create());
+    EXPECT_EQ(ndk::AParcel_writeVector(parcel.get(), events), STATUS_OK);
+    return static_cast<size_t>(AParcel_getDataSize(parcel.get()));
 }
 
 std::vector<int64_t> Timestamps(const std::vector<Event>& events) {
@@ -80,6 +118,17 @@ class OnSampleTest : public InProcessServiceTest {
             std::this_thread::sleep_for(milliseconds(1));
         }
         return true;
+    }
+    nlohmann::json ClientInDump(int32_t handle) {
+        const vyr_test::DumpResult dump = vyr_test::DumpOf(service_->asBinder().get(), {"--json"});
+        const nlohmann::json parsed = nlohmann::json::parse(dump.text);
+        for (const nlohmann::json& client : parsed["clients"]) {
+            if (client["handle"] == handle) return client;
+        }
+        return nlohmann::json();
+    }
+    uint64_t SamplesStored() {
+        return vyr_test::ServicePeer::SamplesStored(*service_, kRangeBlock);
     }
     void Publish(uint32_t time_ms) {
         sensor_doubles::SetRangeData(RangeFrame(time_ms));
@@ -207,6 +256,7 @@ TEST_F(OnSampleTest, RefusedRequestsSayWhy) {
     EXPECT_EQ(EnableOnSample(polling, 10, -1), -22) << "a negative latency";
     EXPECT_EQ(EnableOnSample(polling, 10, 300), -22) << "nothing to hand a batch to";
     EXPECT_EQ(Flush(polling), -22) << "not enabled";
+    EXPECT_EQ(EnableOnSample(timed, 10, kNeverDue + 1), -22) << "past the longest latency";
 
     // Enabled the version 1 way: a timer loop, nothing held, nothing to flush.
     EnableOk(timed, 10);
@@ -264,6 +314,167 @@ TEST_F(OnSampleTest, PolledEventCarriesTheBootTimeOfItsRead) {
     ASSERT_EQ(Poll(poller, &event), 0);
     EXPECT_GE(event.boottime, before);
     EXPECT_LE(event.boottime, after);
+}
+
+// A client whose OnEventBatch takes three of its periods falls behind for a while and catches up:
+// the samples stored meanwhile wait in its queue.
+TEST_F(OnSampleTest, ASlowBatchReceiverGetsEverySampleInOrder) {
+    QueueNumberedFrames(1, 3000, 1);
+    const int32_t pusher = OpenOk(kRange);
+    auto callback = SetCallbackOk(pusher);
+    callback->SetBatchReaction([] { std::this_thread::sleep_for(milliseconds(30)); });
+    ASSERT_EQ(EnableOnSample(pusher, 10, 100), 0);
+    ASSERT_TRUE(callback->WaitForBatches(6, 3 * kWait));
+    ASSERT_TRUE(callback->StopReacting(kWait));
+    service_->Disable(pusher);
+
+    const std::vector<Event> events = callback->Events();
+    EXPECT_TRUE(Consecutive(events));
+    EXPECT_GT(events.size(), callback->BatchSizes().size()) << "samples are held";
+}
+
+// A client stuck in OnEvent for 2 s at 10 ms: the sampling loop and the other clients go on, and
+// it loses its oldest samples beyond its queue, counted in the dump and warned of once.
+TEST_F(OnSampleTest, AClientBlockedInOnEventLosesOnlyItsOwnOldestSamples) {
+    QueueNumberedFrames(1, 5000, 1);
+    const int32_t stuck = OpenOk(kRange);
+    const int32_t other = OpenOk(kRange);
+    auto stuck_callback = SetCallbackOk(stuck);
+    auto other_callback = SetCallbackOk(other);
+    std::atomic<size_t> other_during{0};
+    std::atomic<uint64_t> stored_during{0};
+    stuck_callback->SetReaction([&](size_t count) {
+        if (count != 1) return;
+        const size_t other_before = other_callback->Count();
+        const uint64_t stored_before = SamplesStored();
+        // At least 2 s, and past the queue (100 records at 10 ms) with room to spare.
+        const auto until = std::chrono::steady_clock::now() + std::chrono::seconds(2);
+        const auto give_up = until + 3 * kWait;
+        while (std::chrono::steady_clock::now() < until || SamplesStored() < stored_before + 150) {
+            if (std::chrono::steady_clock::now() > give_up) break;
+            std::this_thread::sleep_for(milliseconds(10));
+        }
+        other_during = other_callback->Count() - other_before;
+        stored_during = SamplesStored() - stored_before;
+    });
+    ASSERT_EQ(EnableOnSample(stuck, 10, 0), 0);
+    ASSERT_EQ(EnableOnSample(other, 10, 0), 0);
+    ASSERT_TRUE(stuck_callback->WaitForEvents(2, 4 * kWait)) << "it never went on";
+    ASSERT_TRUE(stuck_callback->StopReacting(kWait));
+
+    EXPECT_GE(stored_during.load(), 150u) << "the sampling loop waited";
+    EXPECT_GE(other_during.load() + 10, stored_during.load()) << "the other client waited";
+    const nlohmann::json stuck_client = ClientInDump(stuck);
+    const nlohmann::json other_client = ClientInDump(other);
+    EXPECT_GT(stuck_client["samples_dropped"].get<uint64_t>(), 0u) << stuck_client;
+    EXPECT_EQ(other_client["samples_dropped"], 0) << other_client;
+    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN,
+                         "handle " + std::to_string(stuck) +
+                             " is slower than its samples: the oldest of 100 queued are dropped"),
+              1u);
+    service_->Disable(stuck);
+    service_->Disable(other);
+    const std::vector<int64_t> timestamps = Timestamps(stuck_callback->Events());
+    for (size_t i = 1; i < timestamps.size(); ++i) {
+        EXPECT_GT(timestamps[i], timestamps[i - 1]) << "in order, none twice";
+    }
+    EXPECT_TRUE(Consecutive(other_callback->Events()));
+}
+
+// Four-zone frames at 1 ms with the longest latency: batches are handed over at their byte budget,
+// none larger, and nothing is lost.
+TEST_F(OnSampleTest, FourZonesAtTheLongestLatencyComeInBatchesUnderTheBudget) {
+    QueueNumberedFrames(1, 6000, 4);
+    const int32_t pusher = OpenOk(kRange);
+    auto callback = SetCallbackOk(pusher);
+    ASSERT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
+    ASSERT_TRUE(callback->WaitForBatches(3, 3 * kWait));
+    service_->Disable(pusher);
+
+    const std::vector<Event> events = callback->Events();
+    EXPECT_TRUE(Consecutive(events));
+    size_t at = 0;
+    for (size_t size : callback->BatchSizes()) {
+        const std::vector<Event> batch(events.begin() + at, events.begin() + at + size);
+        EXPECT_LE(ParcelBytes(batch), kBatchBudgetBytes);
+        EXPECT_GT(ParcelBytes(batch), kBatchBudgetBytes / 2) << "handed over at the budget";
+        at += size;
+    }
+}
+
+// A Flush answered 0 is completed although Disable stops the client while its batch is being
+// delivered.
+TEST_F(OnSampleTest, AFlushIsCompletedWhenDisableComesDuringItsBatch) {
+    const int32_t poller = OpenOk(kRange);
+    const int32_t pusher = OpenOk(kRange);
+    auto callback = SetCallbackOk(pusher);
+    sensor_doubles::SetRangeData(RangeFrame(0));
+    StartHeldSampling(poller, kRange);
+    ASSERT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
+    Publish(1);
+    ASSERT_TRUE(WaitUntilTaken(pusher));
+    std::promise<void> entered;
+    std::promise<void> release;
+    std::shared_future<void> released = release.get_future().share();
+    callback->SetBatchReaction([&entered, released] {
+        entered.set_value();
+        released.wait();
+    });
+    ASSERT_EQ(Flush(pusher), 0);
+    ASSERT_EQ(entered.get_future().wait_for(kWait), std::future_status::ready);
+    std::future<void> disabled =
+        std::async(std::launch::async, [this, pusher] { service_->Disable(pusher); });
+    ASSERT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO,
+                             "DisableInternal handle " + std::to_string(pusher) + ", mode 3",
+                             kWait));
+    release.set_value();
+    ASSERT_EQ(disabled.wait_for(kWait), std::future_status::ready);
+    on_sample_.erase(pusher);
+    EXPECT_EQ(callback->BatchSizes(), (std::vector<size_t>{1}));
+    EXPECT_EQ(callback->Flushes(), (std::vector<size_t>{1})) << "the completion after the batch";
+}
+
+// Close right after Flush: the flush is still completed, after what was held.
+TEST_F(OnSampleTest, AFlushIsCompletedWhenCloseFollowsAtOnce) {
+    const int32_t poller = OpenOk(kRange);
+    const int32_t pusher = OpenOk(kRange);
+    auto callback = SetCallbackOk(pusher);
+    sensor_doubles::SetRangeData(RangeFrame(0));
+    StartHeldSampling(poller, kRange);
+    ASSERT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
+    Publish(1);
+    Publish(2);
+    ASSERT_TRUE(WaitUntilTaken(pusher));
+    ASSERT_EQ(Flush(pusher), 0);
+    service_->Disable(pusher);
+    service_->Close(pusher);
+    on_sample_.erase(pusher);
+    EXPECT_EQ(Timestamps(callback->Events()), (std::vector<int64_t>{1, 2}));
+    EXPECT_EQ(callback->Flushes(), (std::vector<size_t>{2}));
+}
+
+// When the active period shrinks from 100 ms to 10 ms, the next sample of a 100 ms client is the
+// first one 100 ms after its last, not the tenth one after the change.
+TEST_F(OnSampleTest, TheStrideFollowsTimeWhenTheActivePeriodShrinks) {
+    const int32_t poller = OpenOk(kRange);
+    const int32_t pusher = OpenOk(kRange);
+    const int32_t fast = OpenOk(kRange);
+    auto callback = SetCallbackOk(pusher);
+    sensor_doubles::SetRangeData(RangeFrame(0));
+    StartHeldSampling(poller, kRange, 100);
+    ASSERT_EQ(EnableOnSample(pusher, 100, 0), 0);
+    Publish(1);
+    ASSERT_TRUE(callback->WaitForEvents(1, kWait));
+    const auto first_stored = std::chrono::steady_clock::now();
+    EnableOk(fast, 10);
+    ASSERT_TRUE(WaitForActivePeriod(10));
+    // A whole client period after the first sample; the mode has sampled once since, at 10 ms.
+    std::this_thread::sleep_until(first_stored + milliseconds(100));
+    Publish(2);
+    ASSERT_TRUE(callback->WaitForEvents(2, kWait));
+    for (uint32_t t = 3; t <= 12; ++t) Publish(t);
+    ASSERT_TRUE(callback->WaitForEvents(3, kWait));
+    EXPECT_EQ(Timestamps(callback->Events()), (std::vector<int64_t>{1, 2, 12}));
 }
 
 }  // namespace

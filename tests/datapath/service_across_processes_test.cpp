@@ -29,9 +29,10 @@
 #include <vector>
 
 #include "child_process.h"
+#include "doubles_service_fixture.h"
 #include "recording_callback.h"
-#include "test_files.h"
 
+namespace vyr_datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -39,48 +40,6 @@ using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
 using vyr_test::ChildProcess;
 using vyr_test::RecordingCallback;
-
-constexpr int32_t kRange = 3;
-constexpr milliseconds kWait{10000};
-
-template <typename Predicate>
-bool Eventually(Predicate predicate) {
-    const auto deadline = std::chrono::steady_clock::now() + kWait;
-    while (!predicate()) {
-        if (std::chrono::steady_clock::now() > deadline) return false;
-        std::this_thread::sleep_for(milliseconds(5));
-    }
-    return true;
-}
-
-// Opened once; waited for with a deadline.
-class Gate {
-  public:
-    void Open() {
-        {
-            std::lock_guard<std::mutex> lock(mutex_);
-            open_ = true;
-        }
-        changed_.notify_all();
-    }
-    bool Wait(milliseconds timeout) {
-        std::unique_lock<std::mutex> lock(mutex_);
-        return changed_.wait_for(lock, timeout, [this] { return open_; });
-    }
-
-  private:
-    std::mutex mutex_;
-    std::condition_variable changed_;
-    bool open_ = false;
-};
-
-std::string DoublesService() {
-#if defined(VYR_DOUBLES_SERVICE)
-    return VYR_DOUBLES_SERVICE;
-#else
-    return vyr_test::ProgramBesideThisOne("vyr_doubles_service");
-#endif
-}
 
 // What the client library told the application.
 class Listener : public vyr::SensorClientListener {
@@ -106,74 +65,12 @@ class Listener : public vyr::SensorClientListener {
     }
     bool WaitFor(int* counter, int count) {
         std::unique_lock<std::mutex> lock(mutex_);
-        return changed_.wait_for(lock, kWait, [&] { return *counter >= count; });
+        return changed_.wait_for(lock, kDeadline, [&] { return *counter >= count; });
     }
     std::mutex mutex_;
     std::condition_variable changed_;
     int events_ = 0;
     int resumed_ = 0;
-};
-
-class ServiceAcrossProcessesTest : public ::testing::Test {
-  protected:
-    void SetUp() override {
-        dir_ = vyr_test::MakeTempDir("vyr-doubles-");
-        ASSERT_FALSE(dir_.empty());
-        // The host runtime's registry; a device's servicemanager has no use for it.
-        setenv("VYR_BINDER_DIR", dir_.c_str(), 1);
-        ABinderProcess_startThreadPool();
-        name_ = "vyr.doubles." + std::to_string(getpid()) + "." + std::to_string(++tests_);
-        StartService();
-    }
-
-    void TearDown() override {
-        service_.reset();
-        server_.reset();
-        std::error_code ignored;
-        std::filesystem::remove_all(dir_, ignored);
-    }
-
-    void StartService() {
-        server_ = std::make_unique<ChildProcess>(
-            std::vector<std::string>{DoublesService(), "serve", name_},
-            std::map<std::string, std::string>{}, dir_ + "/service.log");
-        ASSERT_TRUE(server_->ReadLineStartingWith("registered", kWait)) << "no service";
-        service_ =
-            IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_checkService(name_.c_str())));
-        ASSERT_NE(service_, nullptr);
-    }
-
-    void KillService() {
-        server_->Signal(SIGKILL);
-        ASSERT_TRUE(server_->Wait(kWait));
-    }
-
-    int32_t OpenRange() {
-        int32_t handle = 0;
-        EXPECT_TRUE(service_->Open(kRange, &handle).isOk());
-        EXPECT_GT(handle, 0);
-        return handle;
-    }
-
-    void EnableAt(int32_t handle, int32_t period_ms) {
-        int32_t result = -1;
-        ASSERT_TRUE(service_->Enable(handle, period_ms, &result).isOk());
-        ASSERT_EQ(result, 0);
-    }
-
-    // PollOnce's result code.
-    int32_t Poll(int32_t handle) {
-        Event event;
-        int32_t result = 1;
-        EXPECT_TRUE(service_->PollOnce(handle, &event, &result).isOk());
-        return result;
-    }
-
-    static inline int tests_ = 0;
-    std::string dir_;
-    std::string name_;
-    std::unique_ptr<ChildProcess> server_;
-    std::shared_ptr<IVYRService> service_;
 };
 
 TEST_F(ServiceAcrossProcessesTest, OpenEnablePollDisableClose) {
@@ -192,7 +89,7 @@ TEST_F(ServiceAcrossProcessesTest, ACallbackGetsTheSamplesPushed) {
     ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
     ASSERT_EQ(result, 0);
     EnableAt(handle, 20);
-    EXPECT_TRUE(callback->WaitForEvents(3, kWait));
+    EXPECT_TRUE(callback->WaitForEvents(3, kDeadline));
     ASSERT_TRUE(service_->Disable(handle).isOk());
     ASSERT_TRUE(service_->Close(handle).isOk());
 }
@@ -213,8 +110,8 @@ TEST_F(ServiceAcrossProcessesTest, CallsFromOnEventAreServed) {
     int32_t result = -1;
     ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
     EnableAt(handle, 20);
-    EXPECT_TRUE(callback->WaitForEvents(5, kWait));
-    ASSERT_TRUE(callback->StopReacting(kWait));
+    EXPECT_TRUE(callback->WaitForEvents(5, kDeadline));
+    ASSERT_TRUE(callback->StopReacting(kDeadline));
     ASSERT_TRUE(service_->Disable(handle).isOk());
     ASSERT_TRUE(service_->Close(handle).isOk());
     EXPECT_GE(nested_ok.load(), 4);
@@ -223,20 +120,20 @@ TEST_F(ServiceAcrossProcessesTest, CallsFromOnEventAreServed) {
 // The service releases the handle of a client whose process dies.
 TEST_F(ServiceAcrossProcessesTest, TheDeathOfAClientReleasesItsHandle) {
     ChildProcess client({DoublesService(), "client", name_}, {}, dir_ + "/client.log");
-    std::optional<std::string> line = client.ReadLineStartingWith("handle ", kWait);
+    std::optional<std::string> line = client.ReadLineStartingWith("handle ", kDeadline);
     ASSERT_TRUE(line) << "the client never enabled";
     const int32_t handle = atoi(line->c_str() + 7);
     ASSERT_GT(handle, 0);
     EXPECT_NE(Poll(handle), -EINVAL);
     client.Signal(SIGKILL);
-    ASSERT_TRUE(client.Wait(kWait));
+    ASSERT_TRUE(client.Wait(kDeadline));
     EXPECT_TRUE(Eventually([&] { return Poll(handle) == -EINVAL; })) << "the handle outlived it";
 }
 
 // The client library re-attaches to the next instance of the service and its events resume.
 TEST_F(ServiceAcrossProcessesTest, TheClientLibraryReattachesAcrossARestart) {
     vyr::SensorSettings settings;
-    settings.mode = kRange;
+    settings.mode = kRangeMode;
     settings.period_ms = 20;
     settings.use_callback = true;
     vyr::ReattachPolicy policy;
@@ -265,9 +162,9 @@ TEST_F(ServiceAcrossProcessesTest, AVersion1NestedCallBesideADisableEndsTheServi
     std::atomic<bool> nested_failed{false};
     std::shared_ptr<IVYRService> service = service_;
     callback->SetReaction([service, handle, &disabling, &nested_failed](size_t count) {
-        if (count != 1 || !disabling.Wait(kWait)) return;
+        if (count != 1 || !disabling.Wait(kDeadline)) return;
         // Calls back until the service can no longer answer.
-        const auto give_up = std::chrono::steady_clock::now() + 3 * kWait;
+        const auto give_up = std::chrono::steady_clock::now() + 3 * kDeadline;
         Event event;
         int32_t result = 0;
         while (std::chrono::steady_clock::now() < give_up) {
@@ -281,17 +178,18 @@ TEST_F(ServiceAcrossProcessesTest, AVersion1NestedCallBesideADisableEndsTheServi
     int32_t result = -1;
     ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
     EnableAt(handle, 20);
-    ASSERT_TRUE(callback->WaitForEvents(1, kWait));
+    ASSERT_TRUE(callback->WaitForEvents(1, kDeadline));
     auto disabled = std::async(std::launch::async, [&] {
         disabling.Open();
         return service->Disable(handle).isOk();
     });
-    ASSERT_EQ(disabled.wait_for(3 * kWait), std::future_status::ready) << "Disable never returned";
+    ASSERT_EQ(disabled.wait_for(3 * kDeadline), std::future_status::ready)
+        << "Disable never returned";
     EXPECT_FALSE(disabled.get()) << "the service answered Disable";
-    const std::optional<int> status = server_->Wait(kWait);
+    const std::optional<int> status = server_->Wait(kDeadline);
     ASSERT_TRUE(status.has_value()) << "the service still runs";
     EXPECT_TRUE(WIFSIGNALED(*status) && WTERMSIG(*status) == SIGABRT) << "wait status " << *status;
-    EXPECT_TRUE(callback->StopReacting(kWait));
+    EXPECT_TRUE(callback->StopReacting(kDeadline));
     EXPECT_TRUE(nested_failed.load());
 }
 
@@ -363,7 +261,7 @@ TEST_P(NestedOnSampleTest, NestedCallsBesideADisableAndCloseAreServed) {
         EnableSoThatItRuns(handle, *callback, [&, handle, round] {
             if (!first.exchange(false)) return;
             entered.Open();
-            if (!disabling.Wait(kWait)) return;
+            if (!disabling.Wait(kDeadline)) return;
             // Calls back for a while beside the Disable.
             const auto until = std::chrono::steady_clock::now() + milliseconds(20);
             int turn = round;
@@ -371,7 +269,7 @@ TEST_P(NestedOnSampleTest, NestedCallsBesideADisableAndCloseAreServed) {
                 if (!CallBack(*service, handle, turn++)) ++nested_failures;
             } while (std::chrono::steady_clock::now() < until);
         });
-        ASSERT_TRUE(entered.Wait(kWait)) << "the callback never ran";
+        ASSERT_TRUE(entered.Wait(kDeadline)) << "the callback never ran";
         auto released = std::async(std::launch::async, [&] {
             disabling.Open();
             return service->Disable(handle).isOk() && service->Close(handle).isOk();
@@ -383,7 +281,7 @@ TEST_P(NestedOnSampleTest, NestedCallsBesideADisableAndCloseAreServed) {
             ASSERT_TRUE(server_->Running()) << "the service ended";
         }
         EXPECT_TRUE(released.get()) << "Disable or Close failed";
-        EXPECT_TRUE(callback->StopReacting(kWait));
+        EXPECT_TRUE(callback->StopReacting(kDeadline));
         EXPECT_EQ(nested_failures.load(), 0);
     }
     EXPECT_NE(Poll(other), -EINVAL) << "the second client is still open";
@@ -418,7 +316,7 @@ TEST_F(ServiceAcrossProcessesTest, ASlowOnSampleCallbackHoldsOnlyItsOwnDisable) 
     ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
     ASSERT_TRUE(service_->EnableOnSample(handle, 20, 0, &result).isOk());
     ASSERT_EQ(result, 0);
-    ASSERT_TRUE(callback->WaitForEvents(1, kWait));
+    ASSERT_TRUE(callback->WaitForEvents(1, kDeadline));
     std::shared_ptr<IVYRService> service = service_;
     auto released = std::async(std::launch::async, [service, handle] {
         return service->Disable(handle).isOk() && service->Close(handle).isOk();
@@ -431,7 +329,7 @@ TEST_F(ServiceAcrossProcessesTest, ASlowOnSampleCallbackHoldsOnlyItsOwnDisable) 
         ++turn;
     }
     EXPECT_TRUE(released.get());
-    EXPECT_TRUE(callback->StopReacting(kWait));
+    EXPECT_TRUE(callback->StopReacting(kDeadline));
     EXPECT_TRUE(server_->Running());
     EXPECT_NE(Poll(other), -EINVAL);
 }
@@ -440,13 +338,13 @@ TEST_F(ServiceAcrossProcessesTest, ASlowOnSampleCallbackHoldsOnlyItsOwnDisable) 
 // client's death releases its handle.
 TEST_F(ServiceAcrossProcessesTest, AnOnSampleCallbackThatNeverAnswersHoldsOnlyItsOwnClient) {
     ChildProcess client({DoublesService(), "stuck", name_}, {}, dir_ + "/stuck.log");
-    std::optional<std::string> line = client.ReadLineStartingWith("handle ", kWait);
+    std::optional<std::string> line = client.ReadLineStartingWith("handle ", kDeadline);
     ASSERT_TRUE(line) << "the service never called the client";
     const int32_t handle = atoi(line->c_str() + 7);
-    ASSERT_TRUE(client.ReadLineStartingWith("disabling", kWait));
+    ASSERT_TRUE(client.ReadLineStartingWith("disabling", kDeadline));
     const int32_t other = OpenRange();
     // Longer than the service would wait for its lock before ending itself.
-    const auto until = std::chrono::steady_clock::now() + kWait + std::chrono::seconds(1);
+    const auto until = std::chrono::steady_clock::now() + kDeadline + std::chrono::seconds(1);
     int32_t result = 0;
     int turn = 0;
     while (std::chrono::steady_clock::now() < until) {
@@ -457,10 +355,11 @@ TEST_F(ServiceAcrossProcessesTest, AnOnSampleCallbackThatNeverAnswersHoldsOnlyIt
         std::this_thread::sleep_for(milliseconds(10));
     }
     client.Signal(SIGKILL);
-    ASSERT_TRUE(client.Wait(kWait));
+    ASSERT_TRUE(client.Wait(kDeadline));
     EXPECT_TRUE(Eventually([&] { return Poll(handle) == -EINVAL; })) << "the handle outlived it";
     EXPECT_TRUE(server_->Running());
     ASSERT_TRUE(service_->Close(other).isOk());
 }
 
 }  // namespace
+}  // namespace vyr_datapath

@@ -23,6 +23,10 @@ VYRServiceTestPeer::ModeBlockSnapshot VYRServiceTestPeer::SnapshotModeBlock(VYRS
                              params.active_period.load(), params.periods};
 }
 
+uint64_t VYRServiceTestPeer::SamplesStored(VYRService& service, size_t index) {
+    return service.mode_params_.at(index).samples.load();
+}
+
 void VYRServiceTestPeer::PushWorkItem(VYRService& service, const WorkItem& item) {
     service.QueueForMode(item.mode).PushAndSignal(item);
 }

@@ -42,6 +42,8 @@ class VYRServiceTestPeer {
     static void SetOnlyClientProcess(VYRService& service, int32_t handle, pid_t pid);
     // The entry of an open handle, for a test that watches its state from another thread.
     static std::shared_ptr<ClientEntry> Entry(VYRService& service, int32_t handle);
+    // How many samples the block's processing loop has stored; takes no lock.
+    static uint64_t SamplesStored(VYRService& service, size_t index);
     // Whether `handle` has taken the sample that the block holds now.
     static bool HasTakenSample(VYRService& service, size_t index, int32_t handle);
     // What a death notice for the callback binder `binder` does.

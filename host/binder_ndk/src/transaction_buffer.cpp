@@ -3,7 +3,10 @@
 
 #include "transaction_buffer.h"
 
+#include <vyr/binder_host.h>
+
 #include <atomic>
+#include <mutex>
 #include <utility>
 
 namespace vyr_binder {
@@ -11,6 +14,11 @@ namespace {
 
 std::atomic<size_t> g_used{0};
 std::atomic<size_t> g_async_used{0};
+
+std::mutex g_held_mutex;
+// What VyrBinder_holdTransactionBuffer took.
+TransactionBuffer::Charge g_held;
+bool g_holding = false;
 
 size_t RoundUp8(size_t bytes) {
     return (bytes + 7) & ~size_t{7};
@@ -65,3 +73,17 @@ bool TransactionBuffer::Reserve(size_t footprint, bool oneway, Charge* charge) {
 }
 
 }  // namespace vyr_binder
+
+bool VyrBinder_holdTransactionBuffer(size_t bytes) {
+    std::lock_guard<std::mutex> lock(vyr_binder::g_held_mutex);
+    if (vyr_binder::g_holding) return false;
+    vyr_binder::g_holding = vyr_binder::TransactionBuffer::Reserve(
+        vyr_binder::TransactionBuffer::Footprint(bytes, 0), /*oneway=*/false, &vyr_binder::g_held);
+    return vyr_binder::g_holding;
+}
+
+void VyrBinder_releaseTransactionBuffer(void) {
+    std::lock_guard<std::mutex> lock(vyr_binder::g_held_mutex);
+    vyr_binder::g_held = vyr_binder::TransactionBuffer::Charge();
+    vyr_binder::g_holding = false;
+}

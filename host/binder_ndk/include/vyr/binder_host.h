@@ -3,6 +3,8 @@
 
 #pragma once
 
+#include <stdbool.h>
+#include <stddef.h>
 #include <sys/cdefs.h>
 
 __BEGIN_DECLS
@@ -15,5 +17,12 @@ void VyrBinder_shutdown(void);
 // Host runtime only: how many proxies (binders of other processes) this process holds now, so
 // that tests can tell a leaked reference.
 int VyrBinder_liveProxyCount(void);
+
+// Host runtime only: takes `bytes` of this process's transaction buffer, as transactions in
+// flight to it from elsewhere would on a device, until VyrBinder_releaseTransactionBuffer; so
+// that tests can meet the buffer's limit without that traffic. False, and nothing taken, when
+// they do not fit beside what is in flight or something is held already.
+bool VyrBinder_holdTransactionBuffer(size_t bytes);
+void VyrBinder_releaseTransactionBuffer(void);
 
 __END_DECLS
