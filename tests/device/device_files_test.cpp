@@ -168,6 +168,27 @@ TEST_F(DeviceFilesTest, AnEditedFrozenDumpNoLongerMatchesItsHash) {
     EXPECT_FAILS_WITH(CheckCopy(), "aidl_api/android.vyr/1/.hash does not match its files");
 }
 
+// A later version's hash ends with the previous version's number, as the platform's build checks
+// it; one made with version 1's last line ("latest-version") is refused, with the right value.
+TEST_F(DeviceFilesTest, AHashMadeByTheFirstVersionsRuleFailsForALaterVersion) {
+    const fs::path dump = tree_ / "aidl_api/android.vyr/2";
+    vyr_test::ChildProcess hash({"/bin/sh", "-c",
+                                 "cd '" + dump.string() +
+                                     "' && { find ./ -name '*.aidl' -print0 | LC_ALL=C sort -z | "
+                                     "xargs -0 sha1sum && echo latest-version; } | sha1sum | "
+                                     "cut -d ' ' -f 1"},
+                                {}, temp_.Path("hash-stderr"));
+    const std::optional<std::string> wrong = hash.ReadLine(std::chrono::milliseconds(30000));
+    ASSERT_TRUE(wrong) << "no hash";
+    const std::string right = ReadFile(dump / ".hash");
+    ASSERT_NE(*wrong + "\n", right);
+    WriteFile(dump / ".hash", *wrong + "\n");
+    EXPECT_FAILS_WITH(CheckCopy(),
+                      "aidl_api/android.vyr/2/.hash does not match its files "
+                      "(expected " +
+                          right.substr(0, right.size() - 1) + ")");
+}
+
 TEST_F(DeviceFilesTest, AnUndeclaredTypeFails) {
     Append("sepolicy/vyrservice.te", "allow vyrservice vyr_camera_device:chr_file read;\n");
     EXPECT_FAILS_WITH(CheckCopy(), "type vyr_camera_device is used but not declared");

@@ -156,6 +156,11 @@ TEST(OptionsTest, StreamOptions) {
     EXPECT_EQ(options.interface_version, 2);
     ASSERT_TRUE(ParseStreamOptions({"range", "--interface", "1"}, &options, &error)) << error;
     EXPECT_EQ(options.interface_version, 1);
+    EXPECT_EQ(options.callback_delay_ms, 0);
+    ASSERT_TRUE(
+        ParseStreamOptions({"range", "--callback", "--callback-delay", "50"}, &options, &error))
+        << error;
+    EXPECT_EQ(options.callback_delay_ms, 50);
 
     StreamOptions bad;
     EXPECT_FALSE(ParseStreamOptions({"als", "--interface", "3"}, &bad, &error));
@@ -166,6 +171,11 @@ TEST(OptionsTest, StreamOptions) {
     EXPECT_FALSE(ParseStreamOptions({"als", "--count"}, &bad, &error));
     EXPECT_FALSE(ParseStreamOptions({"als", "--seconds", "-1"}, &bad, &error));
     EXPECT_FALSE(ParseStreamOptions({"als", "--fast"}, &bad, &error));
+    StreamOptions polled;
+    EXPECT_FALSE(ParseStreamOptions({"als", "--callback-delay", "50"}, &polled, &error))
+        << "a delay needs a callback";
+    EXPECT_EQ(error, "--callback-delay needs --callback");
+    EXPECT_FALSE(ParseStreamOptions({"als", "--callback", "--callback-delay", "0"}, &bad, &error));
 }
 
 TEST(OptionsTest, GlobalTimeoutAnywhere) {

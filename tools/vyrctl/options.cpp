@@ -159,10 +159,16 @@ bool ParseStreamOptions(const std::vector<std::string>& args, StreamOptions* opt
                 *error = "--interface must be 1 or 2";
                 return false;
             }
+        } else if (arg == "--callback-delay") {
+            if (!TakePositiveInt(args, &i, arg, &options->callback_delay_ms, error)) return false;
         } else {
             *error = "unknown stream option '" + arg + "'";
             return false;
         }
+    }
+    if (options->callback_delay_ms > 0 && !options->use_callback) {
+        *error = "--callback-delay needs --callback";
+        return false;
     }
     return true;
 }
@@ -198,6 +204,7 @@ std::string UsageText() {
            "('help' lists them)\n"
            "  stream als|range [--period MS] [--callback|--poll] [--count N | --seconds S]\n"
            "         [--low-power] [--json] [--no-reconnect] [--interface 1|2]\n"
+           "         [--callback-delay MS]\n"
            "                             print each event of one sensor until done or Ctrl-C;\n"
            "                             carries on across restarts of the service unless\n"
            "                             --no-reconnect; a callback stream of interface 2 (the\n"

@@ -42,6 +42,8 @@ struct StreamOptions {
     bool reconnect = true;
     // The newest interface version to use (--interface 1: the timer of version 1).
     int32_t interface_version = 2;
+    // How much longer than needed each callback takes, as a slow client's would (0: none).
+    int32_t callback_delay_ms = 0;
 };
 
 struct DemoViewOptions {

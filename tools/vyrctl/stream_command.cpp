@@ -8,6 +8,8 @@
 
 #include <algorithm>
 #include <atomic>
+#include <chrono>
+#include <thread>
 
 #include "event_format.h"
 #include "event_queue.h"
@@ -70,7 +72,12 @@ class Stream : public vyr::SensorClientListener {
         return exit_status;
     }
 
-    void OnEvent(const Event& event) override { queue_.Push({event, BootTimeNs()}); }
+    void OnEvent(const Event& event) override {
+        queue_.Push({event, BootTimeNs()});
+        if (options_.callback_delay_ms > 0) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(options_.callback_delay_ms));
+        }
+    }
 
     void OnServiceLost(int32_t handle) override {
         if (!options_.reconnect) {

@@ -61,13 +61,23 @@ interface IVYRService {
     void SetTorchLightState(int state);
     // Version 2. Enables a handle like Enable, but a callback gets each sample as soon as it is
     // stored (every k-th one, k = max(1, round(period / active period))) with no timer of its
-    // own. With maxReportLatency > 0 (milliseconds) samples are held up to that long and handed
-    // over together through OnEventBatch, which a version 1 callback lacks (-95).
+    // own. When the active period changes, the next sample is the one nearest a whole period
+    // after the last. With maxReportLatency > 0 (milliseconds, at most 60000; more is -22)
+    // samples are held up to that long and handed over together through OnEventBatch, which a
+    // version 1 callback lacks (-95); a batch is handed over earlier when it reaches 128 KiB in a
+    // parcel, and one that the client's process cannot take is split and sent again.
+    // Samples wait in a queue of one second of the client's period (at least 16) while its
+    // callback is busy: a client slower than its samples for longer loses the oldest, and the
+    // service's dump counts them (samples_dropped).
     // The delivery thread of a handle enabled this way is stopped under the service's lock by
     // Disable, Close or the client's death, and waited for after the lock is released: a callback
     // that calls back, is slow or never answers holds only the call that stops it (until it
     // returns or its process dies), never another client's call.
     int EnableOnSample(int handle, int period, int maxReportLatency);
-    // Version 2. Delivers what is held for the handle at once, then calls OnFlushComplete.
+    // Version 2. Delivers what is held and queued for the handle at once, then calls
+    // OnFlushComplete. Every Flush answered 0 is completed, after all that was held when it was
+    // called, also when Disable, Close or a new EnableOnSample follows; only the death of the
+    // client's process ends it unanswered. 0, -38 for an unknown handle, -22 for a handle not
+    // enabled on sample with a callback, -95 for a version 1 callback.
     int Flush(int handle);
 }
