@@ -575,6 +575,12 @@ void VYRService::ReleaseDeadClient(int32_t handle, const std::string& cause,
         // The cookie is deliberately null, and no link is made with a null one, so this removes
         // nothing: the link whose notice runs now ends with it, and the runtime reports that.
         AIBinder_unlinkToDeath(entry->callback_binder.get(), entry->death_recipient, nullptr);
+        // The entry's own link is not removed either: its binder is dead, and a link removed
+        // while the notices run gets none (libbinder holds obituaries weakly). That notice may be
+        // the one that releases another handle whose callback is the same binder; it finds this
+        // entry gone and releases that one. Each link is freed once the runtime reports it ended.
+        entry->death_recipient = nullptr;
+        entry->death_cookie = nullptr;
     }
     DisableInternal(handle, /*client_died=*/true, after_unlock);
     CloseInternal(handle, after_unlock);

@@ -37,7 +37,7 @@ void Reached(const char* step) {
 int RunAbusiveClient(int mode, bool with_callback) {
     ABinderProcess_startThreadPool();
     Reached("started");
-    ndk::SpAIBinder binder(AServiceManager_getService("vyrservice"));
+    ndk::SpAIBinder binder(AServiceManager_waitForService("vyrservice"));
     std::shared_ptr<IVYRService> service = IVYRService::fromBinder(binder);
     if (service == nullptr) return 2;
     int32_t handle = -1;

@@ -139,7 +139,7 @@ TEST(InProcessTest, ServiceLookedUpInItsOwnProcessIsTheLocalObject) {
     ndk::SpAIBinder found(AServiceManager_checkService("inprocess.test"));
     ASSERT_NE(nullptr, found.get());
     EXPECT_EQ(service.get(), IVYRService::fromBinder(found).get());
-    ndk::SpAIBinder got(AServiceManager_getService("inprocess.test"));
+    ndk::SpAIBinder got(AServiceManager_waitForService("inprocess.test"));
     EXPECT_EQ(found.get(), got.get());
     EXPECT_NE(EX_NONE, AServiceManager_addService(service->asBinder().get(), "bad name!"));
     EXPECT_NE(EX_NONE, AServiceManager_addService(nullptr, "inprocess.null"));

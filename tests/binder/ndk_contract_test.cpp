@@ -138,6 +138,68 @@ TEST_F(CrossProcessTest, PeerDeathNotifiesEveryLinkOnceWithItsCookie) {
     EXPECT_EQ(STATUS_DEAD_OBJECT, AIBinder_linkToDeath(binder, first.get(), &cookies[0]));
 }
 
+// What the two links of UnlinkingALinkWhoseNoticeHasNotComeRemovesIt did, in order.
+struct NoticeOrder {
+    std::mutex mutex;
+    std::condition_variable changed;
+    std::vector<std::string> steps;
+    AIBinder* binder = nullptr;
+    AIBinder_DeathRecipient* second = nullptr;
+    int cookies[2] = {0, 0};
+
+    static NoticeOrder& Get() {
+        static NoticeOrder order;
+        return order;
+    }
+    void Add(const std::string& step) {
+        {
+            std::lock_guard<std::mutex> lock(mutex);
+            steps.push_back(step);
+        }
+        changed.notify_all();
+    }
+    std::string Name(void* cookie) { return cookie == &cookies[0] ? "1" : "2"; }
+    static void OnDied(void* cookie) {
+        NoticeOrder& order = Get();
+        order.Add("died" + order.Name(cookie));
+        if (cookie != &order.cookies[0]) return;
+        const binder_status_t status =
+            AIBinder_unlinkToDeath(order.binder, order.second, &order.cookies[1]);
+        order.Add("unlink2=" + std::to_string(status));
+    }
+    static void OnUnlinked(void* cookie) {
+        NoticeOrder& order = Get();
+        order.Add("unlinked" + order.Name(cookie));
+    }
+};
+
+// A link removed while the notices of its binder's death run gets no notice of its own: the
+// unlink answers STATUS_DEAD_OBJECT (libbinder's obituaries are sent), yet removes it, and its
+// onUnlinked runs inside the unlink (ibinder.cpp, BpBinder.cpp).
+TEST_F(CrossProcessTest, UnlinkingALinkWhoseNoticeHasNotComeRemovesIt) {
+    pid_t pid = -1;
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);
+    ASSERT_NE(nullptr, service);
+    NoticeOrder& order = NoticeOrder::Get();
+    order.binder = service->asBinder().get();
+    ndk::ScopedAIBinder_DeathRecipient first(AIBinder_DeathRecipient_new(&NoticeOrder::OnDied));
+    ndk::ScopedAIBinder_DeathRecipient second(AIBinder_DeathRecipient_new(&NoticeOrder::OnDied));
+    AIBinder_DeathRecipient_setOnUnlinked(first.get(), &NoticeOrder::OnUnlinked);
+    AIBinder_DeathRecipient_setOnUnlinked(second.get(), &NoticeOrder::OnUnlinked);
+    order.second = second.get();
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(order.binder, first.get(), &order.cookies[0]));
+    ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(order.binder, second.get(), &order.cookies[1]));
+
+    Kill(pid);
+    const std::vector<std::string> expected = {
+        "died1", "unlinked2", "unlink2=" + std::to_string(STATUS_DEAD_OBJECT), "unlinked1"};
+    std::unique_lock<std::mutex> lock(order.mutex);
+    ASSERT_TRUE(order.changed.wait_for(lock, 10s, [&] { return order.steps.size() >= 4; }));
+    // Nothing more arrives.
+    EXPECT_FALSE(order.changed.wait_for(lock, 200ms, [&] { return order.steps.size() > 4; }));
+    EXPECT_EQ(order.steps, expected);
+}
+
 TEST_F(CrossProcessTest, UnlinkedRecipientsAreNotNotified) {
     pid_t pid = -1;
     std::shared_ptr<IVYRService> service = StartServer("vyr.test", &pid);

@@ -45,7 +45,7 @@ int Serve(const std::string& name) {
 
 int Client(const std::string& name) {
     ABinderProcess_startThreadPool();
-    ndk::SpAIBinder binder(AServiceManager_getService(name.c_str()));
+    ndk::SpAIBinder binder(AServiceManager_waitForService(name.c_str()));
     std::shared_ptr<IVYRService> service = IVYRService::fromBinder(binder);
     if (service == nullptr) return 2;
     auto callback = ndk::SharedRefBase::make<RecordingCallback>();
@@ -55,7 +55,7 @@ int Client(const std::string& name) {
 }
 
 int NoPool(const std::string& name) {
-    ndk::SpAIBinder binder(AServiceManager_getService(name.c_str()));
+    ndk::SpAIBinder binder(AServiceManager_waitForService(name.c_str()));
     std::shared_ptr<IVYRService> service = IVYRService::fromBinder(binder);
     if (service == nullptr) return 2;
     auto callback = ndk::SharedRefBase::make<RecordingCallback>();
@@ -78,7 +78,7 @@ void ExitOnDeath(void* /*cookie*/) {
 // status of the step that failed.
 int LinkAndTell(const std::string& name, AIBinder_DeathRecipient_onBinderDied on_died,
                 ndk::SpAIBinder* binder, ndk::ScopedAIBinder_DeathRecipient* recipient) {
-    *binder = ndk::SpAIBinder(AServiceManager_getService(name.c_str()));
+    *binder = ndk::SpAIBinder(AServiceManager_waitForService(name.c_str()));
     if (binder->get() == nullptr) return 2;
     recipient->set(AIBinder_DeathRecipient_new(on_died));
     if (AIBinder_linkToDeath(binder->get(), recipient->get(), nullptr) != STATUS_OK) return 3;

@@ -132,7 +132,8 @@ class SensorClientTest : public ::testing::Test {
         EXPECT_TRUE(fake->Wait(kWait));
     }
     static std::shared_ptr<IVYRService> Service() {
-        ndk::SpAIBinder binder(AServiceManager_getService(SensorClient::kServiceName));
+        // StartFake waited for the registration.
+        ndk::SpAIBinder binder(AServiceManager_checkService(SensorClient::kServiceName));
         return IVYRService::fromBinder(binder);
     }
     // The stand-in's next call lines are exactly `calls`.

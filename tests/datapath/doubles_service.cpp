@@ -9,6 +9,11 @@
 //                                      its range frames are numbered by their time_ms
 //   vyr_doubles_service client <name>  opens a range handle with a callback, enables it at
 //                                      20 ms, prints "handle <h>" and waits to be killed
+//   vyr_doubles_service shared <name> first|second
+//                                      opens two range handles and sets one callback object on
+//                                      both, the first handle's link made first or second;
+//                                      enables both at 20 ms, prints "handles <a> <b>" and waits
+//                                      to be killed
 //   vyr_doubles_service stuck <name>   the same enabled on sample (version 2), with a callback
 //                                      that never returns: prints "handle <h>" once the service
 //                                      is inside it, "disabling" as another thread calls
@@ -83,6 +88,30 @@ int Client(const char* name) {
     for (;;) pause();
 }
 
+int Shared(const char* name, bool first_linked_first) {
+    ABinderProcess_startThreadPool();
+    std::shared_ptr<IVYRService> service =
+        IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+    if (service == nullptr) return 2;
+    int32_t handles[2] = {0, 0};
+    int32_t result = 0;
+    auto callback = ndk::SharedRefBase::make<vyr_test::RecordingCallback>();
+    for (int32_t& handle : handles) {
+        if (!service->Open(kRange, &handle).isOk() || handle <= 0) return 3;
+    }
+    const int32_t order[2] = {first_linked_first ? handles[0] : handles[1],
+                              first_linked_first ? handles[1] : handles[0]};
+    for (int32_t handle : order) {
+        if (!service->SetCallback(handle, callback, &result).isOk() || result != 0) return 4;
+    }
+    for (int32_t handle : handles) {
+        if (!service->Enable(handle, 20, &result).isOk() || result != 0) return 5;
+    }
+    printf("handles %d %d\n", handles[0], handles[1]);
+    fflush(stdout);
+    for (;;) pause();
+}
+
 // An on-sample callback that never answers.
 class StuckCallback : public aidl::android::vyr::BnEventCallback {
   public:
@@ -146,6 +175,9 @@ int main(int argc, char** argv) {
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
     if (argc == 3 && strcmp(argv[1], "stuck") == 0) return Stuck(argv[2]);
-    fprintf(stderr, "usage: %s serve|client|stuck <name>\n", argv[0]);
+    if (argc == 4 && strcmp(argv[1], "shared") == 0) {
+        return Shared(argv[2], strcmp(argv[3], "first") == 0);
+    }
+    fprintf(stderr, "usage: %s serve|client|stuck <name> | shared <name> first|second\n", argv[0]);
     return 64;
 }

@@ -11,6 +11,7 @@
 #include <android/binder_process.h>
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <stdio.h>
 #include <stdlib.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -129,6 +130,32 @@ TEST_F(ServiceAcrossProcessesTest, TheDeathOfAClientReleasesItsHandle) {
     ASSERT_TRUE(client.Wait(kDeadline));
     EXPECT_TRUE(Eventually([&] { return Poll(handle) == -EINVAL; })) << "the handle outlived it";
 }
+
+// One callback object set on two handles: its process's death releases both, whichever handle's
+// link was made first, and the table has room for ten clients again.
+class SharedCallbackDeathTest : public ServiceAcrossProcessesTest,
+                                public ::testing::WithParamInterface<const char*> {};
+
+TEST_P(SharedCallbackDeathTest, ReleasesBothHandles) {
+    ChildProcess client({DoublesService(), "shared", name_, GetParam()}, {}, dir_ + "/client.log");
+    std::optional<std::string> line = client.ReadLineStartingWith("handles ", kDeadline);
+    ASSERT_TRUE(line) << "the client never enabled";
+    int32_t a = 0;
+    int32_t b = 0;
+    ASSERT_EQ(sscanf(line->c_str(), "handles %d %d", &a, &b), 2);
+    EXPECT_NE(Poll(a), -EINVAL);
+    EXPECT_NE(Poll(b), -EINVAL);
+    client.Signal(SIGKILL);
+    ASSERT_TRUE(client.Wait(kDeadline));
+    EXPECT_TRUE(Eventually([&] { return Poll(a) == -EINVAL; })) << "handle " << a << " outlived it";
+    EXPECT_TRUE(Eventually([&] { return Poll(b) == -EINVAL; })) << "handle " << b << " outlived it";
+    std::vector<int32_t> opened;
+    for (int i = 0; i < 10; ++i) opened.push_back(OpenRange());
+    for (int32_t handle : opened) ASSERT_TRUE(service_->Close(handle).isOk());
+    EXPECT_TRUE(server_->Running());
+}
+
+INSTANTIATE_TEST_SUITE_P(LinkOrders, SharedCallbackDeathTest, ::testing::Values("first", "second"));
 
 // The client library re-attaches to the next instance of the service and its events resume.
 TEST_F(ServiceAcrossProcessesTest, TheClientLibraryReattachesAcrossARestart) {

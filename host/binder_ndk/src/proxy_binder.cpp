@@ -4,8 +4,10 @@
 #include "proxy_binder.h"
 
 #include <fcntl.h>
+#include <stdio.h>
 #include <vyr/binder_host.h>
 
+#include <algorithm>
 #include <atomic>
 #include <iterator>
 #include <optional>
@@ -67,23 +69,41 @@ binder_status_t ProxyBinder::LinkToDeath(const DeathLink& link) {
 binder_status_t ProxyBinder::UnlinkToDeath(const std::shared_ptr<DeathRecipientState>& recipient,
                                            void* cookie) {
     std::optional<DeathLink> removed;
+    binder_status_t status = STATUS_OK;
     {
         std::lock_guard<std::mutex> lock(mutex_);
-        // While the notices run the link is still being reported; once they have run, it is
-        // gone.
+        // Once every notice has run, the links are gone.
         if (obituaries_done_) return STATUS_NAME_NOT_FOUND;
-        if (obituaries_sent_) return STATUS_DEAD_OBJECT;
-        for (auto it = links_.rbegin(); it != links_.rend(); ++it) {
-            if (it->recipient == recipient && it->cookie == cookie) {
+        const auto matches = [&](const DeathLink& link) {
+            return link.recipient == recipient && link.cookie == cookie;
+        };
+        if (obituaries_sent_) {
+            // The NDK drops its own reference to the link whatever the driver says; the
+            // obituary list holds links weakly, so a link not yet notified gets no notice.
+            status = STATUS_DEAD_OBJECT;
+            auto it = std::find_if(pending_.rbegin(), pending_.rend(), matches);
+            if (it != pending_.rend()) {
+                removed = std::move(*it);
+                pending_.erase(std::next(it).base());
+            }
+        } else {
+            auto it = std::find_if(links_.rbegin(), links_.rend(), matches);
+            if (it != links_.rend()) {
                 removed = std::move(*it);
                 links_.erase(std::next(it).base());
-                break;
+            } else {
+                status = STATUS_NAME_NOT_FOUND;
             }
         }
     }
-    if (!removed) return STATUS_NAME_NOT_FOUND;
-    removed->Unlinked();
-    return STATUS_OK;
+    if (removed && status == STATUS_DEAD_OBJECT) {
+        // What the platform's NDK logs for it (ibinder.cpp).
+        fprintf(
+            stderr,
+            "AIBinder_unlinkToDeath: removed reference to death recipient but unlink failed.\n");
+    }
+    if (removed) removed->Unlinked();
+    return status;
 }
 
 void ProxyBinder::DropLinksOf(const DeathRecipientState* recipient) {
@@ -103,19 +123,28 @@ void ProxyBinder::DropLinksOf(const DeathRecipientState* recipient) {
 }
 
 void ProxyBinder::SendObituaries() {
-    std::vector<DeathLink> links;
     {
         std::lock_guard<std::mutex> lock(mutex_);
         if (obituaries_sent_) return;
         obituaries_sent_ = true;
-        links.swap(links_);
+        pending_.assign(std::make_move_iterator(links_.begin()),
+                        std::make_move_iterator(links_.end()));
+        links_.clear();
     }
-    for (const DeathLink& link : links) {
-        link.Died();
-        link.Unlinked();
+    while (true) {
+        std::optional<DeathLink> link;
+        {
+            std::lock_guard<std::mutex> lock(mutex_);
+            if (pending_.empty()) {
+                obituaries_done_ = true;
+                return;
+            }
+            link = std::move(pending_.front());
+            pending_.pop_front();
+        }
+        link->Died();
+        link->Unlinked();
     }
-    std::lock_guard<std::mutex> lock(mutex_);
-    obituaries_done_ = true;
 }
 
 }  // namespace vyr_binder

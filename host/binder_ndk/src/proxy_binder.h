@@ -6,6 +6,7 @@
 #include <android-base/thread_annotations.h>
 
 #include <cstdint>
+#include <deque>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -32,12 +33,15 @@ class ProxyBinder : public AIBinder {
     binder_status_t Dump(int fd, const char** args, uint32_t num_args) override;
     binder_status_t LinkToDeath(const DeathLink& link) override;
     // Removes the newest link made with this recipient and this very cookie (a null cookie
-    // matches only a link made with a null one).
+    // matches only a link made with a null one). While the notices of a death run, a link whose
+    // notice has not come yet is removed too: it gets none, its onUnlinked runs here, and the
+    // answer is STATUS_DEAD_OBJECT, as libbinder's BpBinder gives once its obituaries are sent.
     binder_status_t UnlinkToDeath(const std::shared_ptr<DeathRecipientState>& recipient,
                                   void* cookie) override;
     void DropLinksOf(const DeathRecipientState* recipient) override;
 
-    // Called once, on a pool thread, after the connection died: every link fires exactly once.
+    // Called once, on a pool thread, after the connection died: every link still linked when its
+    // turn comes fires exactly once, in the order the links were made.
     void SendObituaries();
 
     const std::shared_ptr<Connection>& connection() const { return connection_; }
@@ -56,6 +60,8 @@ class ProxyBinder : public AIBinder {
     // Every notice has run; the links are gone.
     bool obituaries_done_ GUARDED_BY(mutex_) = false;
     std::vector<DeathLink> links_ GUARDED_BY(mutex_);
+    // The links whose notices have yet to run, once the obituaries are sent.
+    std::deque<DeathLink> pending_ GUARDED_BY(mutex_);
 };
 
 }  // namespace vyr_binder

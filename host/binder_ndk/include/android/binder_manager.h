@@ -20,10 +20,12 @@ __attribute__((warn_unused_result)) binder_exception_t AServiceManager_addServic
 // checkService answers at once; getService waits up to 5 s for the name to appear;
 // waitForService waits until it does. Neither needs a thread pool. Host: the waits are woken by
 // the registration at once, where a device without a pool looks again each second.
+// getService is deprecated, as the platform's header marks it.
 __attribute__((warn_unused_result)) AIBinder* AServiceManager_checkService(const char* instance)
     __INTRODUCED_IN(29);
-__attribute__((warn_unused_result)) AIBinder* AServiceManager_getService(const char* instance)
-    __INTRODUCED_IN(29);
+__attribute__((warn_unused_result)) __attribute__((deprecated(
+    "this polls 5s, use AServiceManager_waitForService or AServiceManager_checkService"))) AIBinder*
+AServiceManager_getService(const char* instance) __INTRODUCED_IN(29);
 __attribute__((warn_unused_result)) AIBinder* AServiceManager_waitForService(const char* instance)
     __INTRODUCED_IN(31);
 bool AServiceManager_isDeclared(const char* instance) __INTRODUCED_IN(31);
