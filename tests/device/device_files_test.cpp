@@ -200,10 +200,40 @@ TEST_F(DeviceFilesTest, AContextWithAnUndeclaredTypeFails) {
 }
 
 TEST_F(DeviceFilesTest, AGenfsPathThatTheCodeDoesNotOpenFails) {
-    Edit("sepolicy/genfs_contexts", "panel0-backlight/state", "panel1-backlight/state");
+    Edit("sepolicy/genfs_contexts", "sysfs /class/backlight/panel0-backlight/state",
+         "sysfs /class/backlight/panel1-backlight/state");
     EXPECT_FAILS_WITH(CheckCopy(),
                       "/sys/class/backlight/panel1-backlight/state is not a path that the code "
                       "opens");
+}
+
+// vyrctl runs from adb shell only in a domain of its own: a vendor binary without a label would be
+// vendor_file, which the shell may not execute.
+TEST_F(DeviceFilesTest, AVendorBinaryWithoutALabelFails) {
+    Edit("sepolicy/file_contexts", "/vendor/bin/vyrctl        u:object_r:vyrctl_exec:s0\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "/vendor/bin/vyrctl (cc_binary vyrctl) has no label");
+}
+
+TEST_F(DeviceFilesTest, APolicyThatLetsTheServiceCallTheShellFails) {
+    Append("sepolicy/vyrservice.te", "userdebug_or_eng(`\n  binder_call(vyrservice, shell)\n')\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "binder_call(vyrservice, shell): the service calls back");
+}
+
+TEST_F(DeviceFilesTest, AnAllowRuleThatLetsTheServiceCallTheShellFails) {
+    Append("sepolicy/vyrservice.te", "allow vyrservice shell:binder { call transfer };\n");
+    EXPECT_FAILS_WITH(CheckCopy(), "the service may call shell over binder");
+}
+
+// The tree labels the backlight attribute by its /class link only; the checker says that the
+// device tree must label the real path, and passes.
+TEST_F(DeviceFilesTest, ABacklightLabelledOnlyByItsLinkIsWarnedOf) {
+    const CheckResult result = CheckCopy();
+    EXPECT_EQ(result.exit_status, 0) << result.output;
+    EXPECT_NE(result.output.find("warning: sepolicy/genfs_contexts: "
+                                 "/sys/class/backlight/panel0-backlight/state is labelled only by "
+                                 "its /class path"),
+              std::string::npos)
+        << result.output;
 }
 
 TEST_F(DeviceFilesTest, AFileContextsPathThatNothingUsesFails) {

@@ -9,6 +9,11 @@
 - every SELinux type, attribute or property type that the policy uses is declared by the policy
   or is one of the platform's (PLATFORM_TYPES);
 - every path in file_contexts and genfs_contexts is the installed binary or a path the code opens;
+- every vendor binary that is not only a test's data has a file_contexts label (else it is
+  vendor_file, which adb shell may not execute);
+- the service's domain calls no shell (its clients, vyrctl among them, have domains of their own);
+- a warning when genfs_contexts labels a sysfs file only by a path under /class, which is usually
+  a link: sysfs labels the real path under /devices, which the device tree must label;
 - the policy is written for the binder that the code registers on: libbinder_ndk always reaches
   servicemanager on /dev/binder, so service_contexts labels every name that the code registers
   (and nothing else) with a service_manager_type, the registering domain and every client
@@ -39,8 +44,10 @@ import licence_header
 
 # Types and attributes of the platform policy (system/sepolicy) that this policy uses.
 PLATFORM_TYPES = {
+    "adbd",
     "apex_info_file",
     "apex_mnt_dir",
+    "devpts",
     "domain",
     "dumpstate",
     "exec_type",
@@ -78,9 +85,13 @@ class Checker:
     def __init__(self, root):
         self.root = root
         self.defects = []
+        self.warnings = []
 
     def defect(self, where, text):
         self.defects.append(f"{where}: {text}")
+
+    def warn(self, where, text):
+        self.warnings.append(f"warning: {where}: {text}")
 
     def read(self, relative):
         with open(os.path.join(self.root, relative), encoding="utf-8") as f:
@@ -341,6 +352,61 @@ def check_policy_paths(checker, binary_paths):
             path = mount + fields[2]
             if path not in opened:
                 checker.defect(contexts, f"{path} is not a path that the code opens")
+
+
+def check_binary_labels(checker, modules):
+    """Every vendor binary installed for its own sake runs in a domain of the policy."""
+    test_data = set()
+    for module in modules:
+        if module["type"] == "cc_test":
+            test_data.update(d.lstrip(":") for d in module["props"].get("data", []))
+    labelled = {path for path, _ in context_entries(checker, "file_contexts")}
+    for module in modules:
+        name = module["props"].get("name", "")
+        if module["type"] != "cc_binary" or name in test_data:
+            continue
+        path = VENDOR_BIN + name
+        if path not in labelled:
+            checker.defect("sepolicy/file_contexts", f"{path} (cc_binary {name}) has no label: it "
+                                                     "would be vendor_file, which no domain may "
+                                                     "execute from adb shell")
+
+
+def service_domains(texts):
+    return {arguments[0] for text in texts.values()
+            for arguments in macro_calls(text, "init_daemon_domain") if arguments}
+
+
+def check_no_calls_into_shell(checker):
+    texts = {te: policy_text(checker, te) for te in policy_files(checker, suffix=".te")}
+    services = service_domains(texts)
+    for te, text in texts.items():
+        for arguments in macro_calls(text, "binder_call"):
+            if len(arguments) == 2 and arguments[0] in services and arguments[1] == "shell":
+                checker.defect(te, f"binder_call({arguments[0]}, shell): the service calls back "
+                                   "its clients' domains, never the shell")
+        for subjects, targets in re.findall(r"\ballow\s+([^;:]+?)\s+([^;:]+?)\s*:\s*binder\b",
+                                            text):
+            if (set(re.findall(r"\w+", subjects)) & services
+                    and "shell" in re.findall(r"\w+", targets)):
+                checker.defect(te, "the service may call shell over binder: the service calls back "
+                                   "its clients' domains, never the shell")
+
+
+def check_backlight_label(checker):
+    paths = []
+    for contexts in policy_files(checker, name="genfs_contexts"):
+        for line in without_comments(checker.read(contexts)).splitlines():
+            fields = line.split()
+            if len(fields) >= 4 and fields[0] == "genfscon" and fields[1] == "sysfs":
+                paths.append((contexts, fields[2]))
+    if any(path.startswith("/devices/") for _, path in paths):
+        return
+    for contexts, path in paths:
+        if path.startswith("/class/"):
+            checker.warn(contexts, f"/sys{path} is labelled only by its /class path, usually a "
+                                   "link; sysfs labels the real path under /sys/devices, which the "
+                                   "device tree must label too")
 
 
 def context_entries(checker, name):
@@ -615,13 +681,16 @@ def main():
     check_policy_types(checker)
     check_policy_paths(checker, binary_paths)
     check_binder_path(checker)
+    check_binary_labels(checker, modules)
+    check_no_calls_into_shell(checker)
+    check_backlight_label(checker)
     check_sources(checker, modules, args.cmake_sources)
     check_host_only(checker, modules)
     check_conventions(checker, modules)
     check_licences(checker, modules)
     check_licence_headers(checker)
     check_test_mapping(checker, modules)
-    for line in checker.defects:
+    for line in checker.warnings + checker.defects:
         print(line)
     if checker.defects:
         return 1
