@@ -18,6 +18,11 @@
 //                                      that never returns: prints "handle <h>" once the service
 //                                      is inside it, "disabling" as another thread calls
 //                                      Disable, and waits to be killed
+//   vyr_doubles_service stuck-batch <name>
+//                                      enables on sample at 1 ms with the longest latency, with
+//                                      that callback: it never returns from its first batch;
+//                                      prints "handle <h>" once inside it and waits to be killed
+//   vyr_doubles_service batch <name>   the same with a callback that takes each batch at once
 
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
@@ -27,6 +32,7 @@
 #include <condition_variable>
 #include <cstdio>
 #include <cstring>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -146,6 +152,26 @@ class StuckCallback : public aidl::android::vyr::BnEventCallback {
     bool called_ = false;
 };
 
+// A client at 1 ms with the longest latency, its batches taken by `callback`; `called` returns
+// once the first has come.
+template <typename Callback>
+int Batches(const char* name, const std::shared_ptr<Callback>& callback,
+            const std::function<void()>& called) {
+    ABinderProcess_startThreadPool();
+    std::shared_ptr<IVYRService> service =
+        IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+    if (service == nullptr) return 2;
+    int32_t handle = 0;
+    int32_t result = 0;
+    if (!service->Open(kRange, &handle).isOk() || handle <= 0) return 3;
+    if (!service->SetCallback(handle, callback, &result).isOk() || result != 0) return 4;
+    if (!service->EnableOnSample(handle, 1, 60000, &result).isOk() || result != 0) return 5;
+    called();
+    printf("handle %d\n", handle);
+    fflush(stdout);
+    for (;;) pause();
+}
+
 int Stuck(const char* name) {
     ABinderProcess_startThreadPool();
     std::shared_ptr<IVYRService> service =
@@ -175,9 +201,21 @@ int main(int argc, char** argv) {
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
     if (argc == 3 && strcmp(argv[1], "stuck") == 0) return Stuck(argv[2]);
+    if (argc == 3 && strcmp(argv[1], "stuck-batch") == 0) {
+        auto callback = ndk::SharedRefBase::make<StuckCallback>();
+        return Batches(argv[2], callback, [callback] { callback->WaitUntilCalled(); });
+    }
+    if (argc == 3 && strcmp(argv[1], "batch") == 0) {
+        auto callback = ndk::SharedRefBase::make<vyr_test::RecordingCallback>();
+        return Batches(argv[2], callback, [callback] {
+            callback->WaitForBatches(1, std::chrono::milliseconds(60000));
+        });
+    }
     if (argc == 4 && strcmp(argv[1], "shared") == 0) {
         return Shared(argv[2], strcmp(argv[3], "first") == 0);
     }
-    fprintf(stderr, "usage: %s serve|client|stuck <name> | shared <name> first|second\n", argv[0]);
+    fprintf(stderr,
+            "usage: %s serve|client|stuck|stuck-batch|batch <name> | shared <name> first|second\n",
+            argv[0]);
     return 64;
 }
