@@ -5,8 +5,6 @@
 // that buffer is shared with every other call in flight to the client's process; here the client
 // holds most of its own buffer through the host runtime to stand for that traffic.
 
-#include <android/binder_parcel.h>
-#include <android/binder_parcel_utils.h>
 #include <gtest/gtest.h>
 #include <vyr/binder_host.h>
 
@@ -14,6 +12,7 @@
 #include <vector>
 
 #include "doubles_service_fixture.h"
+#include "event_parcel.h"
 #include "recording_callback.h"
 
 namespace vyr_datapath {
@@ -26,13 +25,6 @@ using vyr_test::RecordingCallback;
 constexpr size_t kBufferBytes = (size_t{1} << 20) - 2 * 4096;
 // What the client leaves free: a quarter of a full batch.
 constexpr size_t kFreeBytes = 24 * 1024;
-
-// What `events` take in a parcel, as OnEventBatch sends them.
-size_t ParcelBytes(const std::vector<Event>& events) {
-    ndk::ScopedAParcel parcel(AParcel_create());
-    EXPECT_EQ(ndk::AParcel_writeVector(parcel.get(), events), STATUS_OK);
-    return static_cast<size_t>(AParcel_getDataSize(parcel.get()));
-}
 
 class BatchLimitTest : public ServiceAcrossProcessesTest {
   protected:
@@ -68,7 +60,8 @@ TEST_F(BatchLimitTest, ABatchTheClientsBufferRefusesIsSplitAndDeliveredWhole) {
     size_t at = 0;
     for (size_t size : callback->BatchSizes()) {
         const std::vector<Event> batch(events.begin() + at, events.begin() + at + size);
-        EXPECT_LE(ParcelBytes(batch), kFreeBytes) << "a piece that did not fit was delivered";
+        EXPECT_LE(vyr_test::EventsParcelBytes(batch), kFreeBytes)
+            << "a piece that did not fit was delivered";
         at += size;
     }
     ASSERT_TRUE(service_->Close(handle).isOk());

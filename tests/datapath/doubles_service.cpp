@@ -78,16 +78,30 @@ int Serve(const char* name) {
     return 1;
 }
 
-int Client(const char* name) {
+// The service registered as `name`, with this process's binder pool started.
+std::shared_ptr<IVYRService> Connect(const char* name) {
     ABinderProcess_startThreadPool();
-    std::shared_ptr<IVYRService> service =
-        IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+    return IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+}
+
+// A range handle of `service` with `callback` set: 0 with `*handle` set, or the exit status of the
+// step that failed.
+int OpenWithCallback(IVYRService& service,
+                     const std::shared_ptr<aidl::android::vyr::IEventCallback>& callback,
+                     int32_t* handle) {
+    int32_t result = 0;
+    if (!service.Open(kRange, handle).isOk() || *handle <= 0) return 3;
+    if (!service.SetCallback(*handle, callback, &result).isOk() || result != 0) return 4;
+    return 0;
+}
+
+int Client(const char* name) {
+    std::shared_ptr<IVYRService> service = Connect(name);
     if (service == nullptr) return 2;
     int32_t handle = 0;
     int32_t result = 0;
     auto callback = ndk::SharedRefBase::make<vyr_test::RecordingCallback>();
-    if (!service->Open(kRange, &handle).isOk() || handle <= 0) return 3;
-    if (!service->SetCallback(handle, callback, &result).isOk() || result != 0) return 4;
+    if (int failed = OpenWithCallback(*service, callback, &handle)) return failed;
     if (!service->Enable(handle, 20, &result).isOk() || result != 0) return 5;
     printf("handle %d\n", handle);
     fflush(stdout);
@@ -95,9 +109,7 @@ int Client(const char* name) {
 }
 
 int Shared(const char* name, bool first_linked_first) {
-    ABinderProcess_startThreadPool();
-    std::shared_ptr<IVYRService> service =
-        IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+    std::shared_ptr<IVYRService> service = Connect(name);
     if (service == nullptr) return 2;
     int32_t handles[2] = {0, 0};
     int32_t result = 0;
@@ -157,14 +169,11 @@ class StuckCallback : public aidl::android::vyr::BnEventCallback {
 template <typename Callback>
 int Batches(const char* name, const std::shared_ptr<Callback>& callback,
             const std::function<void()>& called) {
-    ABinderProcess_startThreadPool();
-    std::shared_ptr<IVYRService> service =
-        IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+    std::shared_ptr<IVYRService> service = Connect(name);
     if (service == nullptr) return 2;
     int32_t handle = 0;
     int32_t result = 0;
-    if (!service->Open(kRange, &handle).isOk() || handle <= 0) return 3;
-    if (!service->SetCallback(handle, callback, &result).isOk() || result != 0) return 4;
+    if (int failed = OpenWithCallback(*service, callback, &handle)) return failed;
     if (!service->EnableOnSample(handle, 1, 60000, &result).isOk() || result != 0) return 5;
     called();
     printf("handle %d\n", handle);
@@ -173,15 +182,12 @@ int Batches(const char* name, const std::shared_ptr<Callback>& callback,
 }
 
 int Stuck(const char* name) {
-    ABinderProcess_startThreadPool();
-    std::shared_ptr<IVYRService> service =
-        IVYRService::fromBinder(ndk::SpAIBinder(AServiceManager_waitForService(name)));
+    std::shared_ptr<IVYRService> service = Connect(name);
     if (service == nullptr) return 2;
     int32_t handle = 0;
     int32_t result = 0;
     auto callback = ndk::SharedRefBase::make<StuckCallback>();
-    if (!service->Open(kRange, &handle).isOk() || handle <= 0) return 3;
-    if (!service->SetCallback(handle, callback, &result).isOk() || result != 0) return 4;
+    if (int failed = OpenWithCallback(*service, callback, &handle)) return failed;
     if (!service->EnableOnSample(handle, 20, 0, &result).isOk() || result != 0) return 5;
     callback->WaitUntilCalled();
     printf("handle %d\n", handle);
