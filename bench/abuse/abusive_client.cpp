@@ -3,7 +3,6 @@
 
 #include "abusive_client.h"
 
-#include <aidl/android/vyr/BnEventCallback.h>
 #include <aidl/android/vyr/IVYRService.h>
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
@@ -12,20 +11,13 @@
 #include <cstdio>
 #include <thread>
 
+#include "ignoring_callback.h"
+
 namespace vyr_abuse {
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IVYRService;
-
-class IgnoringCallback : public aidl::android::vyr::BnEventCallback {
-  public:
-    ndk::ScopedAStatus OnEvent(const Event&) override { return ndk::ScopedAStatus::ok(); }
-    ndk::ScopedAStatus OnEventBatch(const std::vector<Event>&) override {
-        return ndk::ScopedAStatus::ok();
-    }
-    ndk::ScopedAStatus OnFlushComplete(int32_t) override { return ndk::ScopedAStatus::ok(); }
-};
 
 void Reached(const char* step) {
     printf("%s\n", step);
@@ -50,7 +42,8 @@ int RunAbusiveClient(int mode, bool with_callback) {
     Reached("opened");
     int32_t result = 0;
     if (with_callback) {
-        service->SetCallback(handle, ndk::SharedRefBase::make<IgnoringCallback>(), &result);
+        service->SetCallback(handle, ndk::SharedRefBase::make<vyr_test::IgnoringCallback>(),
+                             &result);
         Reached("callback");
     }
     service->Enable(handle, 20, &result);

@@ -3,21 +3,11 @@
 
 #include "property_file.h"
 
+#include <android-base/strings.h>
+
 #include <fstream>
 
 namespace host_properties {
-namespace {
-
-constexpr char kWhitespace[] = " \t\r\v\f";
-
-std::string Trim(const std::string& text) {
-    const size_t first = text.find_first_not_of(kWhitespace);
-    if (first == std::string::npos) return "";
-    const size_t last = text.find_last_not_of(kWhitespace);
-    return text.substr(first, last - first + 1);
-}
-
-}  // namespace
 
 std::optional<std::string> LookUp(const std::string& path, const std::string& key) {
     std::ifstream file(path);
@@ -27,11 +17,11 @@ std::optional<std::string> LookUp(const std::string& path, const std::string& ke
     while (std::getline(file, line)) {
         // A file written on another system may end its lines with CR LF.
         if (!line.empty() && line.back() == '\r') line.pop_back();
-        const std::string trimmed = Trim(line);
+        const std::string trimmed = android::base::Trim(line);
         if (trimmed.empty() || trimmed[0] == '#') continue;
         const size_t equals = line.find('=');
         if (equals == std::string::npos) continue;
-        if (Trim(line.substr(0, equals)) != key) continue;
+        if (android::base::Trim(line.substr(0, equals)) != key) continue;
         found = line.substr(equals + 1);
     }
     return found;

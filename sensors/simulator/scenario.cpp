@@ -3,6 +3,7 @@
 
 #include "sensors_sim/scenario.h"
 
+#include <android-base/strings.h>
 #include <android/log.h>
 
 #include <cerrno>
@@ -16,14 +17,6 @@ namespace sensors_sim {
 namespace {
 
 constexpr char kTag[] = "sensors_sim";
-constexpr char kWhitespace[] = " \t\r\v\f";
-
-std::string Trim(const std::string& text) {
-    const size_t first = text.find_first_not_of(kWhitespace);
-    if (first == std::string::npos) return "";
-    const size_t last = text.find_last_not_of(kWhitespace);
-    return text.substr(first, last - first + 1);
-}
 
 std::optional<long long> ParseInteger(const std::string& text, long long min, long long max) {
     if (text.empty()) return std::nullopt;
@@ -121,12 +114,12 @@ Scenario ParseScenarioFile(const std::string& path) {
     int number = 0;
     while (std::getline(file, line)) {
         ++number;
-        const std::string trimmed = Trim(line);
+        const std::string trimmed = android::base::Trim(line);
         if (trimmed.empty() || trimmed[0] == '#') continue;
         const size_t equals = trimmed.find('=');
-        const std::string key = Trim(trimmed.substr(0, equals));
+        const std::string key = android::base::Trim(trimmed.substr(0, equals));
         const std::string value =
-            equals == std::string::npos ? "" : Trim(trimmed.substr(equals + 1));
+            equals == std::string::npos ? "" : android::base::Trim(trimmed.substr(equals + 1));
         if (equals == std::string::npos || !Apply(key, value, path, &scenario)) {
             __android_log_print(ANDROID_LOG_WARN, kTag, "%s:%d: ignoring \"%s\"", path.c_str(),
                                 number, trimmed.c_str());

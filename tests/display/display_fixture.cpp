@@ -188,14 +188,11 @@ bool DisplayTest::NotifyUntil(const std::function<bool()>& done, std::chrono::mi
 
 std::string DisplayTest::EnableWorkText(int32_t count, int32_t handle, int32_t period,
                                         int32_t active) {
-    return "EnableWork mode 1, enable count " + std::to_string(count) + ", handle:" + Hex(handle) +
-           " sampling/active period " + std::to_string(period) + "/" + std::to_string(active) +
-           ", sensor type:0";
+    return vyr_test::EnableWorkLine(1, count, handle, period, active, 0);
 }
 
 std::string DisplayTest::DisableWorkText(int32_t count, int32_t handle, int32_t active) {
-    return "DisableWork mode 1, enable count " + std::to_string(count) + ", handle:" + Hex(handle) +
-           ", active_period:" + std::to_string(active) + ", sensor type:0";
+    return vyr_test::DisableWorkLine(1, count, handle, active, 0);
 }
 
 int32_t DisplayTest::DisplayHandle() {

@@ -14,13 +14,6 @@ using sensor_doubles::WaitForCalls;
 
 using EnableDisableTest = ServiceTest;
 
-std::string EnableWorkLog(int32_t mode, int count, int32_t handle, int period, int active,
-                          int sensor_type) {
-    return "EnableWork mode " + std::to_string(mode) + ", enable count " + std::to_string(count) +
-           ", handle:" + Hex(handle) + " sampling/active period " + std::to_string(period) + "/" +
-           std::to_string(active) + ", sensor type:" + std::to_string(sensor_type);
-}
-
 TEST_F(EnableDisableTest, EnableLogsAndQueuesForTheModesWorker) {
     MakeService();
     const int32_t als = Open(1);
@@ -31,28 +24,26 @@ TEST_F(EnableDisableTest, EnableLogsAndQueuesForTheModesWorker) {
         log_.Contains(kTag, ANDROID_LOG_INFO, "Enable handle " + std::to_string(als) + ", mode 1"));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
                               "Enable handle " + std::to_string(range) + ", mode 3"));
-    EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, EnableWorkLog(1, 1, als, 250, 250, 0), kWait));
-    EXPECT_TRUE(
-        log_.WaitFor(kTag, ANDROID_LOG_INFO, EnableWorkLog(3, 1, range, 300, 300, 1), kWait));
+    EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO,
+                             vyr_test::EnableWorkLine(1, 1, als, 250, 250, 0), kWait));
+    EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO,
+                             vyr_test::EnableWorkLine(3, 1, range, 300, 300, 1), kWait));
 
     DisableAndWait(als);
     DisableAndWait(range);
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
                               "DisableInternal handle " + std::to_string(als) + ", mode 1"));
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
-                              "DisableWork mode 1, enable count 0, handle:" + Hex(als) +
-                                  ", active_period:250, sensor type:0"));
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
-                              "DisableWork mode 3, enable count 0, handle:" + Hex(range) +
-                                  ", active_period:300, sensor type:1"));
+    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(1, 0, als, 250, 0)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(3, 0, range, 300, 1)));
 }
 
 TEST_F(EnableDisableTest, PeriodBelowOneBecomesOneSecond) {
     MakeService();
     for (int32_t period : {0, -5}) {
         const int32_t handle = OpenAndEnable(1, period);
-        EXPECT_TRUE(
-            log_.Contains(kTag, ANDROID_LOG_INFO, EnableWorkLog(1, 1, handle, 1000, 1000, 0)));
+        EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
+                                  vyr_test::EnableWorkLine(1, 1, handle, 1000, 1000, 0)));
         EXPECT_EQ(1000, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).active_period);
         DisableAndWait(handle);
         ASSERT_TRUE(service_->Close(handle).isOk());
@@ -62,7 +53,8 @@ TEST_F(EnableDisableTest, PeriodBelowOneBecomesOneSecond) {
 TEST_F(EnableDisableTest, PeriodOfOneMillisecondSamplesAtOneMillisecond) {
     MakeService();
     const int32_t handle = OpenAndEnable(1, 1);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableWorkLog(1, 1, handle, 1, 1, 0)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::EnableWorkLine(1, 1, handle, 1, 1, 0)));
     // At a 1000 ms period three reads would take two seconds.
     const auto start = std::chrono::steady_clock::now();
     ASSERT_TRUE(WaitForCalls(kAlsReadSingleShot, 5, kWait));

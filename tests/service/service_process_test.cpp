@@ -29,6 +29,7 @@
 #include <vector>
 
 #include "child_process.h"
+#include "ignoring_callback.h"
 #include "test_files.h"
 
 namespace {
@@ -269,15 +270,6 @@ TEST_F(ServiceProcessTest, VyrctlShellDrivesTheService) {
 
 // Child role: a client that enables range events with a callback set twice, reports its handle
 // on stdout and waits to be killed.
-class IgnoringCallback : public aidl::android::vyr::BnEventCallback {
-  public:
-    ndk::ScopedAStatus OnEvent(const Event&) override { return ndk::ScopedAStatus::ok(); }
-    ndk::ScopedAStatus OnEventBatch(const std::vector<Event>&) override {
-        return ndk::ScopedAStatus::ok();
-    }
-    ndk::ScopedAStatus OnFlushComplete(int32_t) override { return ndk::ScopedAStatus::ok(); }
-};
-
 int RunCallbackClient() {
     ABinderProcess_startThreadPool();
     ndk::SpAIBinder binder(AServiceManager_checkService(kServiceName));
@@ -288,7 +280,7 @@ int RunCallbackClient() {
     }
     int32_t handle = 0;
     int32_t result = 0;
-    auto callback = ndk::SharedRefBase::make<IgnoringCallback>();
+    auto callback = ndk::SharedRefBase::make<vyr_test::IgnoringCallback>();
     if (!service->Open(3, &handle).isOk() || handle <= 0 ||
         !service->SetCallback(handle, callback, &result).isOk() || result != 0 ||
         !service->SetCallback(handle, callback, &result).isOk() || result != 0 ||

@@ -21,19 +21,6 @@ using sensor_doubles::WaitForCalls;
 
 using WorkerTest = ServiceTest;
 
-std::string EnableLog(int32_t mode, int count, int32_t handle, int period, int active,
-                      int sensor_type) {
-    return "EnableWork mode " + std::to_string(mode) + ", enable count " + std::to_string(count) +
-           ", handle:" + Hex(handle) + " sampling/active period " + std::to_string(period) + "/" +
-           std::to_string(active) + ", sensor type:" + std::to_string(sensor_type);
-}
-
-std::string DisableLog(int32_t mode, int count, int32_t handle, int active, int sensor_type) {
-    return "DisableWork mode " + std::to_string(mode) + ", enable count " + std::to_string(count) +
-           ", handle:" + Hex(handle) + ", active_period:" + std::to_string(active) +
-           ", sensor type:" + std::to_string(sensor_type);
-}
-
 // Range-library calls other than Process, in order, as "Name(args)".
 std::vector<std::string> RangeSwitching() {
     std::vector<std::string> out;
@@ -53,30 +40,38 @@ std::vector<std::string> RangeSwitching() {
 TEST_F(WorkerTest, ActivePeriodIsTheSmallestAndRecomputedOnDisable) {
     MakeService();
     const int32_t first = OpenAndEnable(3, 200);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableLog(3, 1, first, 200, 200, 1)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::EnableWorkLine(3, 1, first, 200, 200, 1)));
     const int32_t second = OpenAndEnable(3, 100);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableLog(3, 2, second, 100, 100, 1)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::EnableWorkLine(3, 2, second, 100, 100, 1)));
     DisableAndWait(second);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(3, 1, second, 200, 1)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(3, 1, second, 200, 1)));
     EXPECT_EQ(200, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).active_period);
     DisableAndWait(first);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(3, 0, first, 200, 1)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(3, 0, first, 200, 1)));
 }
 
 TEST_F(WorkerTest, RecomputedActivePeriodIsCappedAtFiveSeconds) {
     MakeService();
     const int32_t first = OpenAndEnable(1, 8000);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableLog(1, 1, first, 8000, 8000, 0)));
+    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
+                              vyr_test::EnableWorkLine(1, 1, first, 8000, 8000, 0)));
     const int32_t second = OpenAndEnable(1, 9000);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableLog(1, 2, second, 9000, 8000, 0)));
+    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
+                              vyr_test::EnableWorkLine(1, 2, second, 9000, 8000, 0)));
     DisableAndWait(first);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(1, 1, first, 5000, 0)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(1, 1, first, 5000, 0)));
     const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0);
     EXPECT_EQ(5000, block.active_period);
     EXPECT_TRUE(block.running);
     DisableAndWait(second);
     // The last period stays after sampling stops.
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(1, 0, second, 5000, 0)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(1, 0, second, 5000, 0)));
     EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).running);
 }
 
@@ -86,7 +81,8 @@ TEST_F(WorkerTest, DisableWithoutEnableMakesTheCountNegative) {
     ASSERT_TRUE(WaitForWorkLog("DisableWork", 77));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_WARN,
                               "DisableWork: mode 3 enable count becomes negative (-1)"));
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, DisableLog(3, -1, 77, 1000, 1)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(3, -1, 77, 1000, 1)));
     const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2);
     EXPECT_EQ(-1, block.enable_count);
     EXPECT_FALSE(block.running);
@@ -95,7 +91,8 @@ TEST_F(WorkerTest, DisableWithoutEnableMakesTheCountNegative) {
 
     // The count is not clamped: one enable brings it back to 0, and sampling starts regardless.
     const int32_t handle = OpenAndEnable(3, 100);
-    EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO, EnableLog(3, 0, handle, 100, 100, 1)));
+    EXPECT_TRUE(
+        log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::EnableWorkLine(3, 0, handle, 100, 100, 1)));
     EXPECT_TRUE(WaitForCalls(kRangeProcess, 1, kWait));
     DisableAndWait(handle);
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_WARN,
@@ -182,10 +179,11 @@ TEST_F(WorkerTest, ItemsOfOneWorkerAreAppliedInQueueOrder) {
             work.push_back(record.message);
         }
     }
-    EXPECT_EQ(
-        (std::vector<std::string>{EnableLog(3, 1, a, 300, 300, 1), EnableLog(3, 2, b, 200, 200, 1),
-                                  DisableLog(3, 1, a, 200, 1), DisableLog(3, 0, b, 200, 1)}),
-        work);
+    EXPECT_EQ((std::vector<std::string>{vyr_test::EnableWorkLine(3, 1, a, 300, 300, 1),
+                                        vyr_test::EnableWorkLine(3, 2, b, 200, 200, 1),
+                                        vyr_test::DisableWorkLine(3, 1, a, 200, 1),
+                                        vyr_test::DisableWorkLine(3, 0, b, 200, 1)}),
+              work);
 }
 
 }  // namespace

@@ -15,6 +15,19 @@ std::string Hex(int32_t value) {
     return text;
 }
 
+std::string EnableWorkLine(int32_t mode, int count, int32_t handle, int period, int active,
+                           int sensor_type) {
+    return "EnableWork mode " + std::to_string(mode) + ", enable count " + std::to_string(count) +
+           ", handle:" + Hex(handle) + " sampling/active period " + std::to_string(period) + "/" +
+           std::to_string(active) + ", sensor type:" + std::to_string(sensor_type);
+}
+
+std::string DisableWorkLine(int32_t mode, int count, int32_t handle, int active, int sensor_type) {
+    return "DisableWork mode " + std::to_string(mode) + ", enable count " + std::to_string(count) +
+           ", handle:" + Hex(handle) + ", active_period:" + std::to_string(active) +
+           ", sensor type:" + std::to_string(sensor_type);
+}
+
 size_t CountWorkLogs(const std::vector<LogRecord>& records, const std::string& work,
                      int32_t handle) {
     // EnableWork prints "handle:%x sampling", DisableWork "handle:%x, active_period".
