@@ -38,6 +38,27 @@ namespace android {
 namespace vyr {
 namespace binder {
 
+// Threads and locks. "a -> b": b may be taken while a is held, never the other way; locks not
+// joined by an arrow are never held together.
+// - binder pool (the IVYRService methods, dump and death notices; vyrservice.cpp,
+//   vyrservice_dump.cpp): api_lock_ -> a WorkQueue mutex, a client's notify_mutex, a SampleQueue's
+//   mutex, or a block's data_mutex -> a SampleQueue's mutex; links_mutex_ alone. Joins a version 1
+//   notification thread under api_lock_, a version 2 delivery thread after it (DeferredJoin).
+// - worker 0 and 1 (WorkLoop, vyrservice.cpp): its sensor lock; a block's shown_mutex. Waits for
+//   the sensor libraries and joins the mode's processing thread.
+// - processing, one per enabled mode (ProcessLoop, vyrservice.cpp): data_mutex -> a
+//   SampleQueue's mutex; wait_mutex alone. Waits for the sensor library's read and on wait_cv.
+// - notification, version 1 (NotifyLoop, event_delivery.cpp): data_mutex; notify_mutex. Waits
+//   for the client's OnEvent.
+// - delivery, version 2 (SampleLoop, event_delivery.cpp): its SampleQueue's mutex; data_mutex.
+//   Waits for the client's OnEvent, OnEventBatch and OnFlushComplete.
+// - display monitor (MonitorDisplayStatus, vyrservice.cpp): a WorkQueue mutex; display_mutex_.
+//   Waits in poll on the backlight attribute.
+// - process watcher (ClientProcessWatcher, client_process_watcher.cpp): its own mutex; api_lock_
+//   through HandleClientProcessExit. Waits on the pidfds of client processes.
+// Only the binder pool and the process watcher take api_lock_, so a thread joined under it never
+// waits for it, but through a client's nested call (below).
+
 // Shares the range sensor (mode 3) and the spectral ambient-light sensor (mode 1) between
 // clients. Every binder method and the death handler run wholly under `api_lock_`; sensors are
 // switched only by the two workers, and sampled only by the per-mode processing threads.

@@ -69,7 +69,7 @@ bool ExitedWith(const std::optional<int>& status, int code) {
     return status && WIFEXITED(*status) && WEXITSTATUS(*status) == code;
 }
 
-class CrossProcessTest : public SharedServiceTest {
+class RealServiceTest : public SharedServiceTest {
   protected:
     void SetUp() override {
         ASSERT_NO_FATAL_FAILURE(SharedServiceTest::SetUp());
@@ -128,7 +128,7 @@ class CrossProcessTest : public SharedServiceTest {
     int clients_ = 0;
 };
 
-TEST_F(CrossProcessTest, CallbackClientReceivesEventsAtItsPeriod) {
+TEST_F(RealServiceTest, CallbackClientReceivesEventsAtItsPeriod) {
     auto stream = Vyrctl({"--timeout", "10", "stream", "range", "--callback", "--period", "100",
                           "--count", "5", "--json"});
     std::vector<std::string> lines;
@@ -164,7 +164,7 @@ std::vector<std::string> StreamLines(ChildProcess* stream) {
     return lines;
 }
 
-TEST_F(CrossProcessTest, CallbackStreamIsEnabledOnSampleAndStampsEachEvent) {
+TEST_F(RealServiceTest, CallbackStreamIsEnabledOnSampleAndStampsEachEvent) {
     auto stream = Vyrctl({"--timeout", "10", "stream", "range", "--callback", "--period", "33",
                           "--count", "6", "--json"});
     const std::vector<std::string> lines = StreamLines(stream.get());
@@ -186,7 +186,7 @@ TEST_F(CrossProcessTest, CallbackStreamIsEnabledOnSampleAndStampsEachEvent) {
     }
 }
 
-TEST_F(CrossProcessTest, InterfaceOneStreamIsEnabledTheVersion1Way) {
+TEST_F(RealServiceTest, InterfaceOneStreamIsEnabledTheVersion1Way) {
     auto stream = Vyrctl({"--timeout", "10", "stream", "range", "--callback", "--period", "50",
                           "--count", "2", "--json", "--interface", "1"});
     const std::vector<std::string> lines = StreamLines(stream.get());
@@ -198,7 +198,7 @@ TEST_F(CrossProcessTest, InterfaceOneStreamIsEnabledTheVersion1Way) {
     EXPECT_GT(JsonInt(lines[0], "boottime_ns"), 0) << "the service stamps every event";
 }
 
-TEST_F(CrossProcessTest, InterruptedStreamDisablesAndClosesItsHandle) {
+TEST_F(RealServiceTest, InterruptedStreamDisablesAndClosesItsHandle) {
     auto stream = Vyrctl({"stream", "range", "--poll", "--period", "100", "--json"});
     std::optional<std::string> first = stream->ReadLine(kWait);
     ASSERT_TRUE(first);
@@ -210,7 +210,7 @@ TEST_F(CrossProcessTest, InterruptedStreamDisablesAndClosesItsHandle) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
-TEST_F(CrossProcessTest, RangeStreamGoesOnWhenLowPowerIsRefused) {
+TEST_F(RealServiceTest, RangeStreamGoesOnWhenLowPowerIsRefused) {
     auto stream =
         Vyrctl({"stream", "range", "--low-power", "--period", "50", "--count", "2", "--json"});
     std::optional<std::string> line = stream->ReadLine(kWait);
@@ -221,7 +221,7 @@ TEST_F(CrossProcessTest, RangeStreamGoesOnWhenLowPowerIsRefused) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
-TEST_F(CrossProcessTest, TwoClientsEachTakeEverySampleOnce) {
+TEST_F(RealServiceTest, TwoClientsEachTakeEverySampleOnce) {
     int32_t first = 0;
     int32_t second = 0;
     ASSERT_TRUE(service_->Open(kRange, &first).isOk());
@@ -270,7 +270,7 @@ TEST_F(CrossProcessTest, TwoClientsEachTakeEverySampleOnce) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
-TEST_F(CrossProcessTest, KilledClientIsDisabledAndClosed) {
+TEST_F(RealServiceTest, KilledClientIsDisabledAndClosed) {
     auto shell = Vyrctl({"shell"});
     std::string opened = ShellCommand(shell.get(), "open 3");
     int32_t handle = std::atoi(opened.c_str());
@@ -292,7 +292,7 @@ TEST_F(CrossProcessTest, KilledClientIsDisabledAndClosed) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
-TEST_F(CrossProcessTest, DeathOfAClosedClientChangesNothing) {
+TEST_F(RealServiceTest, DeathOfAClosedClientChangesNothing) {
     int32_t survivor = 0;
     int32_t result = 1;
     ASSERT_TRUE(service_->Open(kRange, &survivor).isOk());
@@ -343,7 +343,7 @@ TEST_F(CrossProcessTest, DeathOfAClosedClientChangesNothing) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
-TEST_F(CrossProcessTest, DumpShowsTwoClientsAndTheDeathOfOne) {
+TEST_F(RealServiceTest, DumpShowsTwoClientsAndTheDeathOfOne) {
     auto first = Vyrctl({"shell"});
     auto second = Vyrctl({"shell"});
     const std::string a = OpenInShell(first.get());
@@ -383,7 +383,7 @@ TEST_F(CrossProcessTest, DumpShowsTwoClientsAndTheDeathOfOne) {
     ShellCommand(first.get(), "close " + a);
 }
 
-TEST_F(CrossProcessTest, KilledPollOnlyClientIsDisabledAndClosed) {
+TEST_F(RealServiceTest, KilledPollOnlyClientIsDisabledAndClosed) {
     auto shell = Vyrctl({"shell"});
     const std::string h = OpenInShell(shell.get());
     ASSERT_EQ(ShellCommand(shell.get(), "enable " + h + " 100"), "0");
@@ -398,7 +398,7 @@ TEST_F(CrossProcessTest, KilledPollOnlyClientIsDisabledAndClosed) {
         << "a client without a callback left the sensor running";
 }
 
-TEST_F(CrossProcessTest, ClientKilledBeforeSetCallbackIsClosed) {
+TEST_F(RealServiceTest, ClientKilledBeforeSetCallbackIsClosed) {
     auto shell = Vyrctl({"shell"});
     const std::string h = OpenInShell(shell.get());
     KillClient(shell.get());
@@ -406,7 +406,7 @@ TEST_F(CrossProcessTest, ClientKilledBeforeSetCallbackIsClosed) {
     EXPECT_TRUE(WaitForUnknownHandle(std::atoi(h.c_str())));
 }
 
-TEST_F(CrossProcessTest, TenCrashedClientsLeaveRoomForNewOnes) {
+TEST_F(RealServiceTest, TenCrashedClientsLeaveRoomForNewOnes) {
     std::vector<std::string> handles;
     for (int i = 0; i < 10; ++i) {
         auto shell = Vyrctl({"shell"});
@@ -431,7 +431,7 @@ TEST_F(CrossProcessTest, TenCrashedClientsLeaveRoomForNewOnes) {
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
 }
 
-TEST_F(CrossProcessTest, ACallbackClientsDeathIsHandledOnce) {
+TEST_F(RealServiceTest, ACallbackClientsDeathIsHandledOnce) {
     auto shell = Vyrctl({"shell"});
     const std::string h = OpenInShell(shell.get());
     ASSERT_EQ(ShellCommand(shell.get(), "callback " + h), "0");
@@ -448,7 +448,7 @@ TEST_F(CrossProcessTest, ACallbackClientsDeathIsHandledOnce) {
         << "the callback's death link and the process's end both handled the client";
 }
 
-TEST_F(CrossProcessTest, AHandleOutlivesItsOpenerWhileAnotherProcessUsesIt) {
+TEST_F(RealServiceTest, AHandleOutlivesItsOpenerWhileAnotherProcessUsesIt) {
     auto opener = Vyrctl({"shell"});
     auto user = Vyrctl({"shell"});
     const std::string h = OpenInShell(opener.get());
@@ -477,7 +477,7 @@ TEST_F(CrossProcessTest, AHandleOutlivesItsOpenerWhileAnotherProcessUsesIt) {
     EXPECT_EQ(process_->LogCount("Receive binder death callback"), notices + 1);
 }
 
-TEST_F(CrossProcessTest, CallbackEventsGoOnWhenTheOpenerEnds) {
+TEST_F(RealServiceTest, CallbackEventsGoOnWhenTheOpenerEnds) {
     auto opener = Vyrctl({"shell"});
     auto user = Vyrctl({"shell"});
     const std::string h = OpenInShell(opener.get());
@@ -510,7 +510,7 @@ TEST_F(CrossProcessTest, CallbackEventsGoOnWhenTheOpenerEnds) {
         << "one notice line for each of the two deaths";
 }
 
-TEST_F(CrossProcessTest, DumpCountsTheWatchedProcesses) {
+TEST_F(RealServiceTest, DumpCountsTheWatchedProcesses) {
     const auto watched = [this] {
         const vyr_test::DumpResult dump = vyr_test::DumpOf(service_->asBinder().get(), {"--json"});
         EXPECT_EQ(dump.status, STATUS_OK);
@@ -539,7 +539,7 @@ TEST_F(CrossProcessTest, DumpCountsTheWatchedProcesses) {
     EXPECT_EQ(watched(), before);
 }
 
-TEST_F(CrossProcessTest, ClientThatDisablesAndClosesFromItsCallbackLeavesTheServiceServing) {
+TEST_F(RealServiceTest, ClientThatDisablesAndClosesFromItsCallbackLeavesTheServiceServing) {
     int32_t handle = 0;
     ASSERT_TRUE(service_->Open(kRange, &handle).isOk());
     ASSERT_GT(handle, 0);
@@ -566,7 +566,7 @@ TEST_F(CrossProcessTest, ClientThatDisablesAndClosesFromItsCallbackLeavesTheServ
     service_->Close(next);
 }
 
-TEST_F(CrossProcessTest, RepeatedSetCallbackAndCloseKeepsNoMemory) {
+TEST_F(RealServiceTest, RepeatedSetCallbackAndCloseKeepsNoMemory) {
     auto callback = ndk::SharedRefBase::make<vyr_test::RecordingCallback>();
     const auto cycle = [&] {
         int32_t handle = 0;
@@ -592,7 +592,7 @@ TEST_F(CrossProcessTest, RepeatedSetCallbackAndCloseKeepsNoMemory) {
 #endif
 }
 
-TEST_F(CrossProcessTest, ConfigureAndTorchReachTheSensors) {
+TEST_F(RealServiceTest, ConfigureAndTorchReachTheSensors) {
     auto configure = Vyrctl({"configure", "10", "0", "0", "0", "1", "0", "0", "0", "0", "0", "0"});
     EXPECT_EQ(configure->ReadLine(kWait), "configure -> 0");
     EXPECT_TRUE(ExitedWith(configure->Wait(kWait), 0));
@@ -611,7 +611,7 @@ TEST_F(CrossProcessTest, ConfigureAndTorchReachTheSensors) {
     EXPECT_TRUE(process_->WaitForSensorState("torch", "0", kWait));
 }
 
-TEST_F(CrossProcessTest, ClientGivesUpClearlyWithoutAService) {
+TEST_F(RealServiceTest, ClientGivesUpClearlyWithoutAService) {
     std::string empty_registry = process_->dir() + "/empty-registry";
     ASSERT_EQ(mkdir(empty_registry.c_str(), 0700), 0);
     std::string stderr_path = process_->dir() + "/vyrctl-no-service.log";
