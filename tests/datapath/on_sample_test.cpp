@@ -69,6 +69,12 @@ std::vector<int64_t> Timestamps(const std::vector<Event>& events) {
 
 class OnSampleTest : public InProcessServiceTest {
   protected:
+    void SetUp() override {
+        InProcessServiceTest::SetUp();
+        // Range clients only: without the light sensor there is no display monitor, whose end
+        // could race the tests' counts of threads.
+        StartService(false);
+    }
     void TearDown() override {
         sensor_doubles::Reset();
         for (int32_t handle : on_sample_) service_->Disable(handle);
