@@ -16,7 +16,7 @@ ClientEntry::~ClientEntry() {
 
 void ClientEntry::StopNotify() {
     state = kClientDisabled;
-    if (sample_queue) sample_queue->Stop();
+    if (delivery.sample_queue) delivery.sample_queue->Stop();
     if (notify_cv) {
         // Taking the mutex once orders the state change before any wait that has not yet begun,
         // so the notification cannot fall between the thread's test of `state` and its wait.
@@ -37,7 +37,7 @@ void ClientEntry::Disable() {
     notify_thread.reset();
     notify_cv.reset();
     notify_mutex.reset();
-    sample_queue.reset();
+    delivery.sample_queue.reset();
 }
 
 std::unique_ptr<std::thread> ClientEntry::StopAndHandOver() {
@@ -45,7 +45,7 @@ std::unique_ptr<std::thread> ClientEntry::StopAndHandOver() {
     std::unique_ptr<std::thread> thread = std::move(notify_thread);
     notify_cv.reset();
     notify_mutex.reset();
-    sample_queue.reset();
+    delivery.sample_queue.reset();
     return thread;
 }
 

@@ -57,49 +57,66 @@ struct ClientEntry {
     // Stopped by StopNotify, and its thread not yet joined.
     bool AwaitsJoin() const { return state == kClientDisabled && notify_thread != nullptr; }
 
+    // The record of a client as the service has always kept it.
     const int32_t mode;
     int32_t period = 0;
-    // Set by EnableOnSample (version 2): delivery on each stored sample instead of a timer, and
-    // the longest that samples may be held to be handed over together (0: none are held).
-    bool on_sample = false;
-    int32_t max_report_latency = 0;
     std::shared_ptr<aidl::android::vyr::IEventCallback> callback;
-    // The callback's interface version, asked by the first EnableOnSample after SetCallback (0:
-    // not asked yet); only a callback known to be of version 2 gets version 2's methods.
-    int32_t callback_version = 0;
     // kClientEnabled or kClientDisabled; the notification thread polls it without a lock.
     std::atomic<int32_t> state{kClientDisabled};
     std::unique_ptr<std::thread> notify_thread;
-    // Raised by each Enable; a notification thread runs only while it matches the value it was
-    // started with, so one let go by a nested Disable ends although a nested Enable followed.
-    std::atomic<uint64_t> notify_generation{0};
     std::unique_ptr<std::condition_variable> notify_cv;
     std::unique_ptr<std::mutex> notify_mutex;
-    // The samples on their way to the thread of a client enabled on sample with a callback; null
-    // otherwise.
-    std::shared_ptr<SampleQueue> sample_queue;
     // Held strongly: an in-process callback keeps only a weak reference to its own binder.
     ndk::SpAIBinder callback_binder;
     AIBinder_DeathRecipient* death_recipient = nullptr;
     // Owned by the service, which keeps every cookie for as long as a link made with it can
     // fire, also after this entry is gone.
     const DeathCookie* death_cookie = nullptr;
-    // The process that opened the handle, when it is not the service's own (for the dump).
-    pid_t opener_pid = 0;
+
+    // What the project adds to that record, one sub-record per concern.
+
+    // How events reach the client beyond version 1's timer loop.
+    struct Delivery {
+        // Raised by each enable; a delivery thread runs only while it matches the value it was
+        // started with, so one let go by a nested Disable ends although a nested enable followed.
+        std::atomic<uint64_t> generation{0};
+        // Set by EnableOnSample (version 2): delivery on each stored sample instead of a timer,
+        // and the longest that samples may be held to be handed over together (0: none are held).
+        bool on_sample = false;
+        int32_t max_report_latency = 0;
+        // The callback's interface version, asked by the first EnableOnSample after SetCallback
+        // (0: not asked yet); only a callback known to be of version 2 gets version 2's methods.
+        int32_t callback_version = 0;
+        // The samples on their way to the thread of a client enabled on sample with a callback;
+        // null otherwise.
+        std::shared_ptr<SampleQueue> sample_queue;
+    };
+    Delivery delivery;
+
     // The processes that use the handle: the opener and every caller of a method on it since,
     // by the watcher's id (a pid alone may name a later process). Without a linked callback the
     // handle goes when the last of them has ended.
-    std::map<ClientProcessWatcher::ProcessId, pid_t> processes;
-    // A caller that could not be watched (the service's own process, or a failed pidfd): its
-    // end cannot be known, so the handle is never released for the end of the others.
-    bool unwatched_user = false;
-    // For the dump: events handed to the callback, and polls answered with no new sample.
-    std::atomic<uint64_t> events_delivered{0};
-    std::atomic<uint64_t> polls_refused{0};
-    // For the dump: samples that a client enabled on sample lost on the way (its queues count
-    // them, also after the client's thread was stopped).
-    const std::shared_ptr<std::atomic<uint64_t>> samples_dropped =
-        std::make_shared<std::atomic<uint64_t>>(0);
+    struct Users {
+        // The process that opened the handle, when it is not the service's own (for the dump).
+        pid_t opener_pid = 0;
+        std::map<ClientProcessWatcher::ProcessId, pid_t> processes;
+        // A caller that could not be watched (the service's own process, or a failed pidfd): its
+        // end cannot be known, so the handle is never released for the end of the others.
+        bool unwatched = false;
+    };
+    Users users;
+
+    // What only the dump reads.
+    struct Counters {
+        // Events handed to the callback, and polls answered with no new sample.
+        std::atomic<uint64_t> events_delivered{0};
+        std::atomic<uint64_t> polls_refused{0};
+        // Samples that a client enabled on sample lost on the way (its queues count them, also
+        // after the client's thread was stopped).
+        const std::shared_ptr<std::atomic<uint64_t>> samples_dropped =
+            std::make_shared<std::atomic<uint64_t>>(0);
+    };
+    Counters counters;
 };
 
 }  // namespace binder

@@ -28,6 +28,7 @@ namespace binder {
 // that lock, hence the atomics. `periods` and `enable_count` are guarded by that sensor lock,
 // which the service owns (one per worker, not per block), so no annotation here can name it.
 struct ServiceModeParams {
+    // The block as the service has always kept it.
     std::atomic<bool> running{false};
     // Handle to the sampling period it asked for, in milliseconds.
     std::unordered_map<int32_t, int32_t> periods;
@@ -41,22 +42,33 @@ struct ServiceModeParams {
     ALSResult als_data GUARDED_BY(data_mutex){};
     // Handles that have taken the current sample.
     std::set<int32_t> polled_handles GUARDED_BY(data_mutex);
-    // When the sensor library returned the stored sample, CLOCK_BOOTTIME nanoseconds.
-    int64_t boottime_ns GUARDED_BY(data_mutex) = 0;
-    // The queues of the clients enabled on sample with a callback, offered each sample as it is
-    // stored.
-    std::vector<std::shared_ptr<SampleQueue>> sample_queues GUARDED_BY(data_mutex);
     std::mutex data_mutex;
-    // For the dump, written by the processing loop: samples stored, those marked invalid, and
-    // when the last one was stored (steady clock, 0 before the first).
-    std::atomic<uint64_t> samples{0};
-    std::atomic<uint64_t> invalid_samples{0};
-    std::atomic<int64_t> last_sample_ns{0};
-    // `enable_count` and `periods` as the worker left them after its last item, for the dump:
-    // it never waits for a worker that may be joining a sampling thread.
-    std::mutex shown_mutex;
-    int32_t shown_enable_count GUARDED_BY(shown_mutex) = 0;
-    std::unordered_map<int32_t, int32_t> shown_periods GUARDED_BY(shown_mutex);
+
+    // What the project adds to that block, one sub-record per concern.
+
+    // What version 2's delivery on sample takes from each stored sample.
+    struct SampleFeed {
+        // When the sensor library returned the stored sample, CLOCK_BOOTTIME nanoseconds.
+        int64_t boottime_ns = 0;
+        // The queues of the clients enabled on sample with a callback, offered each sample as it
+        // is stored.
+        std::vector<std::shared_ptr<SampleQueue>> sample_queues;
+    };
+    SampleFeed feed GUARDED_BY(data_mutex);
+
+    // What only the dump reads. The processing loop counts the samples stored, those marked
+    // invalid, and when the last one was stored (steady clock, 0 before the first). The worker
+    // copies `enable_count` and `periods` after each item: the dump never waits for a worker that
+    // may be joining a sampling thread.
+    struct DumpState {
+        std::atomic<uint64_t> samples{0};
+        std::atomic<uint64_t> invalid_samples{0};
+        std::atomic<int64_t> last_sample_ns{0};
+        std::mutex mutex;
+        int32_t enable_count GUARDED_BY(mutex) = 0;
+        std::unordered_map<int32_t, int32_t> periods GUARDED_BY(mutex);
+    };
+    DumpState dump;
 };
 
 }  // namespace binder

@@ -24,7 +24,7 @@ VYRServiceTestPeer::ModeBlockSnapshot VYRServiceTestPeer::SnapshotModeBlock(VYRS
 }
 
 uint64_t VYRServiceTestPeer::SamplesStored(VYRService& service, size_t index) {
-    return service.mode_params_.at(index).samples.load();
+    return service.mode_params_.at(index).dump.samples.load();
 }
 
 void VYRServiceTestPeer::PushWorkItem(VYRService& service, const WorkItem& item) {
@@ -34,9 +34,9 @@ void VYRServiceTestPeer::PushWorkItem(VYRService& service, const WorkItem& item)
 void VYRServiceTestPeer::SetOnlyClientProcess(VYRService& service, int32_t handle, pid_t pid) {
     ApiLockGuard lock(service.api_lock_, std::chrono::seconds(10));
     ClientEntry& entry = *service.clients_.at(handle);
-    entry.processes.clear();
-    entry.unwatched_user = false;
-    service.NoteProcess(&entry, pid);
+    entry.users.processes.clear();
+    entry.users.unwatched = false;
+    service.client_processes_.NoteProcess(&entry.users, pid);
 }
 
 std::shared_ptr<ClientEntry> VYRServiceTestPeer::Entry(VYRService& service, int32_t handle) {

@@ -76,7 +76,7 @@ bool EventDelivery::PollInternal(int32_t handle, int32_t mode, Event* event) {
         } else {
             sample.als = params->als_data;
         }
-        sample.boottime_ns = params->boottime_ns;
+        sample.boottime_ns = params->feed.boottime_ns;
     }
     // Converted outside the lock so that the processing loop waits for one copy at most.
     if ((mode == kRangeMode ? sample.range.valid : sample.als.valid) == 0) {
@@ -88,24 +88,28 @@ bool EventDelivery::PollInternal(int32_t handle, int32_t mode, Event* event) {
 }
 
 void EventDelivery::Start(int32_t handle, const std::shared_ptr<ClientEntry>& entry) {
-    const uint64_t generation = ++entry->notify_generation;
+    const uint64_t generation = ++entry->delivery.generation;
     entry->notify_cv = std::make_unique<std::condition_variable>();
     entry->notify_mutex = std::make_unique<std::mutex>();
-    entry->sample_queue.reset();
-    if (entry->on_sample && entry->callback) {
-        entry->sample_queue =
-            std::make_shared<SampleQueue>(handle, entry->period, entry->samples_dropped);
+    entry->delivery.sample_queue.reset();
+    if (entry->delivery.on_sample && entry->callback) {
+        entry->delivery.sample_queue =
+            std::make_shared<SampleQueue>(handle, entry->period, entry->counters.samples_dropped);
     }
     entry->state = kClientEnabled;
     if (!entry->callback) {
         return;
     }
-    if (entry->sample_queue) {
+    if (entry->delivery.sample_queue) {
         // Subscribed before the thread starts: no sample stored after Enable returned is missed.
-        Subscribe(entry->mode, entry->sample_queue);
-        OnSampleClient client{
-            handle,     entry->mode,     entry->period,      entry->max_report_latency,
-            generation, entry->callback, entry->sample_queue};
+        Subscribe(entry->mode, entry->delivery.sample_queue);
+        OnSampleClient client{handle,
+                              entry->mode,
+                              entry->period,
+                              entry->delivery.max_report_latency,
+                              generation,
+                              entry->callback,
+                              entry->delivery.sample_queue};
         entry->notify_thread = std::make_unique<std::thread>(&EventDelivery::SampleLoop, this,
                                                              entry, std::move(client));
     } else {
@@ -117,7 +121,7 @@ void EventDelivery::Start(int32_t handle, const std::shared_ptr<ClientEntry>& en
 void EventDelivery::SampleStored(ServiceModeParams& params) {
     // Held by the caller; GCC cannot parse an annotation that names an argument's member.
     android::base::ScopedLockAssertion held(params.data_mutex);
-    if (params.sample_queues.empty()) return;
+    if (params.feed.sample_queues.empty()) return;
     const int32_t mode = params.mode;
     QueuedSample sample;
     if (mode == kRangeMode) {
@@ -127,10 +131,10 @@ void EventDelivery::SampleStored(ServiceModeParams& params) {
         if (params.als_data.valid == 0) return;
         sample.als = params.als_data;
     }
-    sample.boottime_ns = params.boottime_ns;
+    sample.boottime_ns = params.feed.boottime_ns;
     const int32_t active_period = params.active_period;
     const auto now = std::chrono::steady_clock::now();
-    for (const std::shared_ptr<SampleQueue>& queue : params.sample_queues) {
+    for (const std::shared_ptr<SampleQueue>& queue : params.feed.sample_queues) {
         if (queue->Offer(sample, active_period, now)) params.polled_handles.insert(queue->handle());
     }
 }
@@ -138,13 +142,13 @@ void EventDelivery::SampleStored(ServiceModeParams& params) {
 void EventDelivery::Subscribe(int32_t mode, const std::shared_ptr<SampleQueue>& queue) {
     ServiceModeParams& params = params_for_mode_(mode);
     std::lock_guard<std::mutex> lock(params.data_mutex);
-    params.sample_queues.push_back(queue);
+    params.feed.sample_queues.push_back(queue);
 }
 
 void EventDelivery::Unsubscribe(int32_t mode, const std::shared_ptr<SampleQueue>& queue) {
     ServiceModeParams& params = params_for_mode_(mode);
     std::lock_guard<std::mutex> lock(params.data_mutex);
-    auto& queues = params.sample_queues;
+    auto& queues = params.feed.sample_queues;
     queues.erase(std::remove(queues.begin(), queues.end(), queue), queues.end());
 }
 
@@ -155,7 +159,7 @@ void EventDelivery::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entr
     }
     // False once the client was disabled, also when a nested Enable has started a successor.
     const auto enabled = [&entry, generation] {
-        return entry->state == kClientEnabled && entry->notify_generation == generation;
+        return entry->state == kClientEnabled && entry->delivery.generation == generation;
     };
     Event event{};
     while (enabled() && entry->callback) {
@@ -170,7 +174,7 @@ void EventDelivery::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entr
             ATRACE_BEGIN("vyr deliver");
             callback->OnEvent(event);
             ATRACE_END();
-            ++entry->events_delivered;
+            ++entry->counters.events_delivered;
             if (!enabled()) {
                 break;
             }
@@ -193,7 +197,7 @@ void EventDelivery::NotifyLoop(int32_t handle, std::shared_ptr<ClientEntry> entr
 void EventDelivery::SampleLoop(std::shared_ptr<ClientEntry> entry, OnSampleClient client) {
     const uint64_t generation = client.generation;
     const auto enabled = [&entry, generation] {
-        return entry->state == kClientEnabled && entry->notify_generation == generation;
+        return entry->state == kClientEnabled && entry->delivery.generation == generation;
     };
     const int32_t handle = client.handle;
     const std::chrono::milliseconds latency(client.max_report_latency);
@@ -208,7 +212,7 @@ void EventDelivery::SampleLoop(std::shared_ptr<ClientEntry> entry, OnSampleClien
     const auto hand_over = [&] {
         if (held.empty()) return;
         const BatchResult result = SendBatch(callback, held);
-        entry->events_delivered += result.delivered;
+        entry->counters.events_delivered += result.delivered;
         if (result.dropped != 0) {
             queue.CountDropped(result.dropped);
             ALOGE("OnEventBatch handle %d: %zu events refused even one by one are dropped", handle,
@@ -234,7 +238,7 @@ void EventDelivery::SampleLoop(std::shared_ptr<ClientEntry> entry, OnSampleClien
                 dead = callback.OnEvent(event).getStatus() == STATUS_DEAD_OBJECT;
                 ATRACE_END();
                 if (dead) break;
-                ++entry->events_delivered;
+                ++entry->counters.events_delivered;
                 continue;
             }
             const size_t bytes = BatchBytes(event);
