@@ -218,22 +218,31 @@ void VYRService::CloseInternal(int32_t handle, DeferredJoin* after_unlock) {
     entry->callback.reset();
 }
 
+std::shared_ptr<ClientEntry> VYRService::CallerEntryLocked(const char* method, int32_t handle,
+                                                           android_LogPriority priority,
+                                                           int32_t error, int32_t* result) {
+    auto it = clients_.find(handle);
+    if (it == clients_.end()) {
+        LOG_PRI(priority, LOG_TAG, "%s invalid handle %d", method, handle);
+        *result = error;
+        return nullptr;
+    }
+    client_processes_.NoteCaller(&it->second->users);
+    return it->second;
+}
+
 // Enable, disable and low power.
 
 std::shared_ptr<ClientEntry> VYRService::EnableTargetLocked(const char* method, int32_t handle,
                                                             int32_t* result) {
-    auto it = clients_.find(handle);
-    if (it == clients_.end()) {
-        ALOGE("%s invalid handle %d", method, handle);
-        *result = -ENOSYS;
-        return nullptr;
-    }
-    client_processes_.NoteCaller(&it->second->users);
-    if (it->second->state == kClientEnabled) {
+    const std::shared_ptr<ClientEntry> found =
+        CallerEntryLocked(method, handle, ANDROID_LOG_ERROR, -ENOSYS, result);
+    if (found == nullptr) return nullptr;
+    if (found->state == kClientEnabled) {
         *result = -EEXIST;
         return nullptr;
     }
-    return it->second;
+    return found;
 }
 
 ndk::ScopedAStatus VYRService::Enable(int32_t handle, int32_t period, int32_t* result) {
@@ -316,14 +325,10 @@ void VYRService::StartClientLocked(int32_t handle, const std::shared_ptr<ClientE
 
 ndk::ScopedAStatus VYRService::Flush(int32_t handle, int32_t* result) {
     LOCK_API();
-    auto it = clients_.find(handle);
-    if (it == clients_.end()) {
-        ALOGE("%s invalid handle %d", __func__, handle);
-        *result = -ENOSYS;
-        return Ok();
-    }
-    ClientEntry& entry = *it->second;
-    client_processes_.NoteCaller(&entry.users);
+    const std::shared_ptr<ClientEntry> found =
+        CallerEntryLocked(__func__, handle, ANDROID_LOG_ERROR, -ENOSYS, result);
+    if (found == nullptr) return Ok();
+    ClientEntry& entry = *found;
     if (entry.state != kClientEnabled || !entry.delivery.sample_queue) {
         ALOGE("%s handle %d is not enabled on sample with a callback", __func__, handle);
         *result = -EINVAL;
@@ -375,14 +380,11 @@ void VYRService::DisableInternal(int32_t handle, bool client_died, DeferredJoin*
 
 ndk::ScopedAStatus VYRService::EnableLowPower(int32_t handle, bool enable, int32_t* result) {
     LOCK_API();
-    auto it = clients_.find(handle);
-    if (it == clients_.end()) {
-        ALOGE("%s invalid handle %d", __func__, handle);
-        *result = -ENOSYS;
-        return Ok();
-    }
-    client_processes_.NoteCaller(&it->second->users);
-    if (it->second->mode == kRangeMode) {
+    const std::shared_ptr<ClientEntry> found =
+        CallerEntryLocked(__func__, handle, ANDROID_LOG_ERROR, -ENOSYS, result);
+    if (found == nullptr) return Ok();
+    ClientEntry& entry = *found;
+    if (entry.mode == kRangeMode) {
         *result = -EINVAL;
         return Ok();
     }
@@ -398,14 +400,10 @@ ndk::ScopedAStatus VYRService::SetCallback(int32_t handle,
                                            const std::shared_ptr<IEventCallback>& callback,
                                            int32_t* result) {
     LOCK_API();
-    auto it = clients_.find(handle);
-    if (it == clients_.end()) {
-        ALOGW("%s invalid handle %d", __func__, handle);
-        *result = -EINVAL;
-        return Ok();
-    }
-    ClientEntry& entry = *it->second;
-    client_processes_.NoteCaller(&entry.users);
+    const std::shared_ptr<ClientEntry> found =
+        CallerEntryLocked(__func__, handle, ANDROID_LOG_WARN, -EINVAL, result);
+    if (found == nullptr) return Ok();
+    ClientEntry& entry = *found;
     if (entry.state == kClientEnabled) {
         // The notification thread reads the callback without a lock.
         ALOGE("%s failed. callback can only be set at DISABLE state", __func__);
@@ -496,14 +494,11 @@ ndk::ScopedAStatus VYRService::ConfigureParameters(int32_t handle,
                                                    const std::vector<int32_t>& params,
                                                    int32_t* result) {
     LOCK_API();
-    auto it = clients_.find(handle);
-    if (it == clients_.end()) {
-        ALOGE("%s invalid handle %d", __func__, handle);
-        *result = -ENOSYS;
-        return Ok();
-    }
-    client_processes_.NoteCaller(&it->second->users);
-    const int32_t mode = it->second->mode;
+    const std::shared_ptr<ClientEntry> found =
+        CallerEntryLocked(__func__, handle, ANDROID_LOG_ERROR, -ENOSYS, result);
+    if (found == nullptr) return Ok();
+    ClientEntry& entry = *found;
+    const int32_t mode = entry.mode;
     if (mode != kRangeMode) {
         ALOGE("%s, mode %d is not supported", __func__, mode);
         *result = -EINVAL;

@@ -6,6 +6,7 @@
 #include <aidl/android/vyr/BnVYRService.h>
 #include <android-base/thread_annotations.h>
 #include <android/binder_ibinder.h>
+#include <android/log.h>
 #include <sys/types.h>
 
 #include <array>
@@ -157,6 +158,11 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // without the API lock.
     static void FinishRelease(std::vector<std::shared_ptr<ClientEntry>>* released);
 
+    // The entry of `handle`, its caller noted as a user; null for an unknown handle, logged at
+    // `priority` as "`method` invalid handle `handle`" with `*result` set to `error`.
+    std::shared_ptr<ClientEntry> CallerEntryLocked(const char* method, int32_t handle,
+                                                   android_LogPriority priority, int32_t error,
+                                                   int32_t* result) REQUIRES(api_lock_);
     // The client that Enable or EnableOnSample (`method`) may enable, with its caller noted; null
     // with `*result` set for an unknown handle (-38) or a client already enabled (-17).
     std::shared_ptr<ClientEntry> EnableTargetLocked(const char* method, int32_t handle,

@@ -40,6 +40,22 @@ class DeathLinkRegistryTest : public vyr_binder_test::CrossProcessTest {
         });
     }
 
+    // Kills `pid`, the server of `binder`, with a new link to `binder` in place, which tells when
+    // the notices have run: only that link gets one. A freed link's memory may be that link's
+    // now, so the notice is told apart by being the only one, not by its cookie.
+    void ExpectOnlyASentinelNotice(const ndk::SpAIBinder& binder, pid_t pid) {
+        ClientEntry sentinel(3);
+        sentinel.callback_binder = binder;
+        registry_.Link(&sentinel);
+        const void* sentinel_cookie = sentinel.death_cookie;
+        Kill(pid);
+        ASSERT_TRUE(DeathLog::Get().WaitFor(1));
+        ASSERT_EQ(DeathLog::Get().notices().size(), 1u);
+        EXPECT_EQ(DeathLog::Get().notices()[0].first, sentinel_cookie);
+        DeathLinkRegistry::LetGo(&sentinel);
+        EXPECT_TRUE(AllFreed(&registry_));
+    }
+
     DeathLinkRegistry registry_{nullptr, &DeathLog::OnDied};
 };
 
@@ -71,18 +87,7 @@ TEST_F(DeathLinkRegistryTest, AnUnlinkedLinkGetsNoNoticeAndIsFreed) {
     EXPECT_EQ(entry->death_recipient, nullptr);
     EXPECT_TRUE(AllFreed(&registry_));
 
-    // A second link to the same binder tells when the notices have run.
-    ClientEntry sentinel(3);
-    sentinel.callback_binder = entry->callback_binder;
-    registry_.Link(&sentinel);
-    const void* sentinel_cookie = sentinel.death_cookie;
-    Kill(pid);
-    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
-    // The unlinked link's memory may be the sentinel's now: only the sentinel's notice came.
-    ASSERT_EQ(DeathLog::Get().notices().size(), 1u);
-    EXPECT_EQ(DeathLog::Get().notices()[0].first, sentinel_cookie);
-    DeathLinkRegistry::LetGo(&sentinel);
-    EXPECT_TRUE(AllFreed(&registry_));
+    ExpectOnlyASentinelNotice(entry->callback_binder, pid);
 }
 
 TEST_F(DeathLinkRegistryTest, ALinkThatCannotBeMadeIsRecordedNowhere) {
@@ -105,17 +110,7 @@ TEST_F(DeathLinkRegistryTest, ARegistryDestroyedWithLiveLinksLeavesNoNoticeBehin
         registry.Link(entry.get());
         ASSERT_NE(entry->death_cookie, nullptr);
     }
-    ClientEntry sentinel(3);
-    sentinel.callback_binder = entry->callback_binder;
-    registry_.Link(&sentinel);
-    const void* sentinel_cookie = sentinel.death_cookie;
-    Kill(pid);
-    ASSERT_TRUE(DeathLog::Get().WaitFor(1));
-    // The freed link's memory may be the sentinel's now: only the sentinel's notice came.
-    ASSERT_EQ(DeathLog::Get().notices().size(), 1u);
-    EXPECT_EQ(DeathLog::Get().notices()[0].first, sentinel_cookie);
-    DeathLinkRegistry::LetGo(&sentinel);
-    EXPECT_TRUE(AllFreed(&registry_));
+    ExpectOnlyASentinelNotice(entry->callback_binder, pid);
 }
 
 }  // namespace
