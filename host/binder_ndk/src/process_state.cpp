@@ -117,16 +117,19 @@ ndk::SpAIBinder ProcessState::Lookup(const std::string& name) {
     return binder;
 }
 
+std::shared_ptr<Connection> ProcessState::LiveConnectionLocked(const std::string& peer_key) {
+    auto it = by_key_.find(peer_key);
+    if (it == by_key_.end()) return nullptr;
+    std::shared_ptr<Connection> existing = it->second.lock();
+    return existing != nullptr && !existing->dead() ? existing : nullptr;
+}
+
 std::shared_ptr<Connection> ProcessState::ConnectTo(const std::string& dir,
                                                     const std::string& peer_key) {
     {
         std::lock_guard<std::mutex> lock(mutex_);
         if (shutting_down_) return nullptr;
-        auto it = by_key_.find(peer_key);
-        if (it != by_key_.end()) {
-            std::shared_ptr<Connection> existing = it->second.lock();
-            if (existing != nullptr && !existing->dead()) return existing;
-        }
+        if (std::shared_ptr<Connection> existing = LiveConnectionLocked(peer_key)) return existing;
     }
     std::string path = Registry::SocketPath(dir, peer_key);
     sockaddr_un addr{};
@@ -145,12 +148,8 @@ std::shared_ptr<Connection> ProcessState::ConnectTo(const std::string& dir,
     {
         std::lock_guard<std::mutex> lock(mutex_);
         if (shutting_down_) return nullptr;
-        auto it = by_key_.find(peer_key);
-        if (it != by_key_.end()) {
-            std::shared_ptr<Connection> existing = it->second.lock();
-            // Another thread connected meanwhile; ours was never used and just closes.
-            if (existing != nullptr && !existing->dead()) return existing;
-        }
+        // Another thread connected meanwhile; ours was never used and just closes.
+        if (std::shared_ptr<Connection> existing = LiveConnectionLocked(peer_key)) return existing;
         by_key_[peer_key] = connection;
     }
     connection->Start(own_key);

@@ -47,6 +47,8 @@ class ProcessState {
     ProcessState() = default;
     std::shared_ptr<Connection> ConnectTo(const std::string& dir, const std::string& key);
     bool EnsureListenerLocked(const std::string& dir) REQUIRES(mutex_);
+    // The open connection to `peer_key`, if there is one that is not dead.
+    std::shared_ptr<Connection> LiveConnectionLocked(const std::string& peer_key) REQUIRES(mutex_);
     static void RemoveFilesAtExit();
 
     Looper looper_;
