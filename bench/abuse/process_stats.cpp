@@ -8,7 +8,7 @@
 #include <cstdlib>
 #include <fstream>
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 namespace {
 
 long CountEntries(const std::string& dir_path) {
@@ -42,4 +42,4 @@ std::string ProcessStats::ToString() const {
            std::to_string(threads) + " threads";
 }
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

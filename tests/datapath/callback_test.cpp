@@ -14,7 +14,7 @@
 #include "recording_callback.h"
 #include "vyrservice_test_peer.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -33,16 +33,7 @@ MultiRangingData Frame(uint32_t time_ms) {
     return data;
 }
 
-class CallbackTest : public DataPathTest {
-  protected:
-    std::shared_ptr<RecordingCallback> SetCallbackOk(int32_t handle) {
-        auto callback = NewCallback();
-        int32_t result = 1;
-        EXPECT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
-        EXPECT_EQ(result, 0);
-        return callback;
-    }
-};
+using CallbackTest = DataPathTest;
 
 TEST_F(CallbackTest, CallbackOfAnEnabledClientCannotBeReplaced) {
     sensor_doubles::SetRangeData(Frame(1));
@@ -105,9 +96,8 @@ TEST_F(CallbackTest, EachSampleIsPushedOnce) {
 TEST_F(CallbackTest, ClientWithoutCallbackGetsNoNotificationThread) {
     sensor_doubles::SetRangeData(Frame(1));
     int32_t pusher = Open(kRange);
-    EXPECT_GT(pusher, 0);
     int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
+    for (int32_t handle : {pusher, poller}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     EXPECT_EQ(0, Enable(poller, 1));
     StartHeldSampling(pusher, kRange);
@@ -154,9 +144,8 @@ TEST_F(CallbackTest, DisableDuringTheSleepEndsTheLoopAtOnce) {
 
 TEST_F(CallbackTest, PeriodBelowOneBecomesOneSecond) {
     int32_t zero = Open(kRange);
-    EXPECT_GT(zero, 0);
     int32_t negative = Open(kRange);
-    EXPECT_GT(negative, 0);
+    for (int32_t handle : {zero, negative}) EXPECT_GT(handle, 0);
     SetCallbackOk(zero);
     EXPECT_EQ(0, Enable(zero, 0));
     EXPECT_EQ(0, Enable(negative, -5));
@@ -173,4 +162,4 @@ TEST_F(CallbackTest, PeriodBelowOneBecomesOneSecond) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

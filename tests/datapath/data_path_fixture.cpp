@@ -8,7 +8,7 @@
 
 #include "vyrservice_test_peer.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 
 namespace {
 
@@ -41,6 +41,14 @@ void DataPathTest::TearDown() {
 
 std::shared_ptr<RecordingCallback> DataPathTest::NewCallback() {
     return ndk::SharedRefBase::make<RecordingCallback>();
+}
+
+std::shared_ptr<RecordingCallback> DataPathTest::SetCallbackOk(int32_t handle) {
+    auto callback = NewCallback();
+    int32_t result = 1;
+    EXPECT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
+    EXPECT_EQ(result, 0);
+    return callback;
 }
 
 const char* DataPathTest::ReadCallOf(int32_t mode) {
@@ -77,4 +85,4 @@ void DataPathTest::WaitForIdleWorkers() {
     }
 }
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -17,14 +17,10 @@
 #include "sensor_doubles.h"
 #include "service_fixture.h"
 
-namespace vyr_datapath {
-
-using vyr_test::RecordingCallback;
+namespace vyr_test::datapath {
 
 constexpr int32_t kAls = 1;
 constexpr int32_t kRange = 3;
-using vyr_test::kTag;
-using vyr_test::kWait;
 
 // A valid one-zone range record of sensor time `time_ms`.
 MultiRangingData RangeFrame(uint32_t time_ms);
@@ -46,9 +42,11 @@ class DataPathTest : public vyr_test::ServiceFixture {
     static const char* ReadCallOf(int32_t mode);
 
     std::shared_ptr<RecordingCallback> NewCallback();
+    // A new callback set on `handle`, which must take it.
+    std::shared_ptr<RecordingCallback> SetCallbackOk(int32_t handle);
 
   private:
     const char* held_call_ = nullptr;
 };
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

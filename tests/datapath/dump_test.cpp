@@ -16,7 +16,7 @@
 #include "data_path_fixture.h"
 #include "service_dump.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using nlohmann::json;
@@ -66,9 +66,8 @@ class DumpTest : public DataPathTest {
 
 TEST_F(DumpTest, FollowsOpenEnableAtTwoPeriodsAndDisable) {
     const int32_t first = Open(kRange);
-    EXPECT_GT(first, 0);
     const int32_t second = Open(kRange);
-    EXPECT_GT(second, 0);
+    for (int32_t handle : {first, second}) EXPECT_GT(handle, 0);
     json dump = Json();
     EXPECT_EQ(dump["api_lock"], "taken");
     EXPECT_EQ(ClientOf(dump, first)["state"], "disabled");
@@ -126,9 +125,8 @@ TEST_F(DumpTest, TextShowsTheSameValuesAsJson) {
 
 TEST_F(DumpTest, CountsSamplesInvalidSamplesRefusedPollsAndDeliveries) {
     const int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
     const int32_t pushed = Open(kRange);
-    EXPECT_GT(pushed, 0);
+    for (int32_t handle : {poller, pushed}) EXPECT_GT(handle, 0);
     auto callback = NewCallback();
     int32_t result = 1;
     ASSERT_TRUE(service_->SetCallback(pushed, callback, &result).isOk());
@@ -219,4 +217,4 @@ TEST_F(DumpTest, BusyApiLockIsReportedFirstAndTheDumpDoesNotWaitForIt) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -100,7 +100,7 @@ void operator delete[](void* memory, std::size_t) noexcept {
     std::free(memory);
 }
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 class EnableOrderTest : public DataPathTest {};
@@ -148,4 +148,4 @@ TEST_F(EnableOrderTest, ThreadLetGoByANestedDisableNeverSeesAHalfMadeEnable) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -19,7 +19,7 @@
 #include "thread_count.h"
 #include "vyrservice_test_peer.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -206,4 +206,4 @@ TEST_F(DeathDuringNestedCallTest, DeathNoticeReleasesWithoutWaitingForTheClients
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

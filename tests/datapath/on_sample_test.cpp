@@ -23,7 +23,7 @@
 #include "thread_count.h"
 #include "vyrservice_test_peer.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -83,13 +83,6 @@ class OnSampleTest : public DataPathTest {
         DataPathTest::TearDown();
     }
 
-    std::shared_ptr<RecordingCallback> SetCallbackOk(int32_t handle) {
-        auto callback = NewCallback();
-        int32_t result = 1;
-        EXPECT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
-        EXPECT_EQ(result, 0);
-        return callback;
-    }
     int32_t EnableOnSample(int32_t handle, int32_t period_ms, int32_t latency_ms) {
         int32_t result = 1;
         EXPECT_TRUE(service_->EnableOnSample(handle, period_ms, latency_ms, &result).isOk());
@@ -134,9 +127,8 @@ class OnSampleTest : public DataPathTest {
     // sampling lets the test publish each one: its handle.
     int32_t StartHoldingClient(std::shared_ptr<RecordingCallback>* callback) {
         const int32_t poller = Open(kRange);
-        EXPECT_GT(poller, 0);
         const int32_t pusher = Open(kRange);
-        EXPECT_GT(pusher, 0);
+        for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
         *callback = SetCallbackOk(pusher);
         sensor_doubles::SetRangeData(RangeFrame(0));
         StartHeldSampling(poller, kRange);
@@ -153,9 +145,8 @@ class OnSampleTest : public DataPathTest {
 
 TEST_F(OnSampleTest, ClientAtThreeTimesTheActivePeriodGetsEveryThirdSample) {
     const int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
     const int32_t pusher = Open(kRange);
-    EXPECT_GT(pusher, 0);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);  // samples at 1 ms
@@ -181,9 +172,8 @@ TEST_F(OnSampleTest, ClientAtThreeTimesTheActivePeriodGetsEveryThirdSample) {
 
 TEST_F(OnSampleTest, ChangeOfTheActivePeriodChangesTheStride) {
     const int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
     const int32_t pusher = Open(kRange);
-    EXPECT_GT(pusher, 0);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
@@ -239,11 +229,9 @@ TEST_F(OnSampleTest, FlushDeliversWhatIsHeldThenCompletes) {
 
 TEST_F(OnSampleTest, FlushWithNothingHeldStillCompletes) {
     const int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
     const int32_t batched = Open(kRange);
-    EXPECT_GT(batched, 0);
     const int32_t direct = Open(kRange);
-    EXPECT_GT(direct, 0);
+    for (int32_t handle : {poller, batched, direct}) EXPECT_GT(handle, 0);
     auto batched_callback = SetCallbackOk(batched);
     auto direct_callback = SetCallbackOk(direct);
     sensor_doubles::SetRangeData(RangeFrame(0));
@@ -263,9 +251,8 @@ TEST_F(OnSampleTest, FlushWithNothingHeldStillCompletes) {
 
 TEST_F(OnSampleTest, RefusedRequestsSayWhy) {
     const int32_t polling = Open(kRange);
-    EXPECT_GT(polling, 0);
     const int32_t timed = Open(kRange);
-    EXPECT_GT(timed, 0);
+    for (int32_t handle : {polling, timed}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(timed);
     constexpr int32_t kUnknown = 12345;
 
@@ -286,9 +273,8 @@ TEST_F(OnSampleTest, RefusedRequestsSayWhy) {
 
 TEST_F(OnSampleTest, DisableEndsTheDeliveryThread) {
     const int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
     const int32_t pusher = Open(kRange);
-    EXPECT_GT(pusher, 0);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
@@ -308,9 +294,8 @@ TEST_F(OnSampleTest, DisableEndsTheDeliveryThread) {
 
 TEST_F(OnSampleTest, DeathOfTheClientEndsItsDelivery) {
     const int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
     const int32_t pusher = Open(kRange);
-    EXPECT_GT(pusher, 0);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
@@ -363,9 +348,8 @@ TEST_F(OnSampleTest, ASlowBatchReceiverGetsEverySampleInOrder) {
 TEST_F(OnSampleTest, AClientBlockedInOnEventLosesOnlyItsOwnOldestSamples) {
     QueueNumberedFrames(1, 5000, 1);
     const int32_t stuck = Open(kRange);
-    EXPECT_GT(stuck, 0);
     const int32_t other = Open(kRange);
-    EXPECT_GT(other, 0);
+    for (int32_t handle : {stuck, other}) EXPECT_GT(handle, 0);
     auto stuck_callback = SetCallbackOk(stuck);
     auto other_callback = SetCallbackOk(other);
     std::atomic<size_t> other_during{0};
@@ -478,11 +462,9 @@ TEST_F(OnSampleTest, AFlushIsCompletedWhenCloseFollowsAtOnce) {
 // first one 100 ms after its last, not the tenth one after the change.
 TEST_F(OnSampleTest, TheStrideFollowsTimeWhenTheActivePeriodShrinks) {
     const int32_t poller = Open(kRange);
-    EXPECT_GT(poller, 0);
     const int32_t pusher = Open(kRange);
-    EXPECT_GT(pusher, 0);
     const int32_t fast = Open(kRange);
-    EXPECT_GT(fast, 0);
+    for (int32_t handle : {poller, pusher, fast}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange, 100);
@@ -502,4 +484,4 @@ TEST_F(OnSampleTest, TheStrideFollowsTimeWhenTheActivePeriodShrinks) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

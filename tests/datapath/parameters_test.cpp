@@ -13,7 +13,7 @@
 #include "data_path_fixture.h"
 #include "recording_callback.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -148,9 +148,8 @@ TEST_F(ParametersTest, UnknownHandleResultPerMethod) {
 
 TEST_F(ParametersTest, LowPowerIsRefusedForRangeClients) {
     int32_t range = Open(kRange);
-    EXPECT_GT(range, 0);
     int32_t light = Open(kAls);
-    EXPECT_GT(light, 0);
+    for (int32_t handle : {range, light}) EXPECT_GT(handle, 0);
     int32_t result = 0;
     EXPECT_TRUE(service_->EnableLowPower(range, true, &result).isOk());
     EXPECT_EQ(result, -22);
@@ -159,4 +158,4 @@ TEST_F(ParametersTest, LowPowerIsRefusedForRangeClients) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -11,7 +11,7 @@
 
 #include "data_path_fixture.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -172,9 +172,8 @@ TEST_F(PollTest, AlsEventSwapsTheLastTwoChannels) {
 TEST_F(PollTest, EachHandleTakesASampleOnce) {
     sensor_doubles::SetRangeData(ExtremeFrame(1));
     int32_t sampler = Open(kRange);
-    EXPECT_GT(sampler, 0);
     int32_t other = Open(kRange);
-    EXPECT_GT(other, 0);
+    for (int32_t handle : {sampler, other}) EXPECT_GT(handle, 0);
     StartHeldSampling(sampler, kRange);
 
     Event first{};
@@ -261,9 +260,8 @@ TEST_F(PollTest, UnknownHandleIsInvalidArgument) {
 TEST_F(PollTest, StoredSampleOutlivesSampling) {
     sensor_doubles::SetRangeData(ExtremeFrame(2));
     int32_t sampler = Open(kRange);
-    EXPECT_GT(sampler, 0);
     int32_t late = Open(kRange);
-    EXPECT_GT(late, 0);
+    for (int32_t handle : {sampler, late}) EXPECT_GT(handle, 0);
     StartHeldSampling(sampler, kRange);
     Event event{};
     ASSERT_EQ(Poll(sampler, &event), 0);
@@ -284,4 +282,4 @@ TEST_F(PollTest, StoredSampleOutlivesSampling) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

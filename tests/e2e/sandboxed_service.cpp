@@ -18,7 +18,7 @@
 
 #include "test_files.h"
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 namespace {
 
 using namespace std::chrono_literals;
@@ -203,4 +203,4 @@ std::optional<pid_t> SandboxedService::WaitForRestart(std::chrono::milliseconds 
     return service_pid_;
 }
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

@@ -5,7 +5,7 @@
 
 #include <fstream>
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 
 namespace {
 
@@ -75,4 +75,4 @@ size_t CountRecords(const std::vector<LogLine>& records, const std::string& tag,
     return count;
 }
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

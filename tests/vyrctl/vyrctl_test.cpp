@@ -16,8 +16,10 @@
 #include "options.h"
 #include "shell.h"
 
-namespace vyrctl {
+namespace vyr_test::vyrctl {
 namespace {
+
+using namespace ::vyrctl;
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
@@ -343,4 +345,4 @@ TEST_F(ShellTest, HandlesLeftOpenAreDisabledAndClosed) {
 }
 
 }  // namespace
-}  // namespace vyrctl
+}  // namespace vyr_test::vyrctl
