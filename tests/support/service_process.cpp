@@ -9,7 +9,6 @@
 
 #include <filesystem>
 #include <fstream>
-#include <sstream>
 #include <thread>
 
 #include "test_files.h"
@@ -83,13 +82,7 @@ bool ServiceProcess::Running() {
 }
 
 std::map<std::string, std::string> ServiceProcess::SensorState() const {
-    std::map<std::string, std::string> state;
-    std::istringstream lines(ReadFile(dir_ + "/sensor_state"));
-    for (std::string line; std::getline(lines, line);) {
-        size_t eq = line.find('=');
-        if (eq != std::string::npos) state[line.substr(0, eq)] = line.substr(eq + 1);
-    }
-    return state;
+    return ReadKeyValues(dir_ + "/sensor_state");
 }
 
 bool ServiceProcess::WaitForSensorState(const std::string& key, const std::string& value,

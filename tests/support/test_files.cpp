@@ -3,6 +3,7 @@
 
 #include "test_files.h"
 
+#include <android-base/strings.h>
 #include <limits.h>
 #include <stdlib.h>
 #include <unistd.h>
@@ -32,6 +33,22 @@ std::string ReadFile(const std::string& path) {
     std::stringstream text;
     text << in.rdbuf();
     return text.str();
+}
+
+std::vector<std::string> SplitLines(const std::string& text) {
+    std::vector<std::string> lines = android::base::Split(text, "\n");
+    // What follows the last newline is a line only if it is not empty.
+    if (lines.back().empty()) lines.pop_back();
+    return lines;
+}
+
+std::map<std::string, std::string> ReadKeyValues(const std::string& path) {
+    std::map<std::string, std::string> values;
+    for (const std::string& line : SplitLines(ReadFile(path))) {
+        const size_t equals = line.find('=');
+        if (equals != std::string::npos) values[line.substr(0, equals)] = line.substr(equals + 1);
+    }
+    return values;
 }
 
 std::string ProgramBesideThisOne(const std::string& name) {
