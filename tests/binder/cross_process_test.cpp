@@ -33,6 +33,7 @@
 #include "frame_io.h"
 #include "process_fixture.h"
 #include "raw_peer.h"
+#include "test_files.h"
 #include "test_service.h"
 #include "thread_count.h"
 #include "wire.h"
@@ -712,17 +713,7 @@ class PeerLimitTest : public MalformedFrameTest {
     }
 
     // Resident memory of the helper, in KiB.
-    long HelperRssKib() {
-        FILE* status = fopen(("/proc/" + std::to_string(pid_) + "/status").c_str(), "r");
-        if (status == nullptr) return -1;
-        char line[256];
-        long kib = -1;
-        while (fgets(line, sizeof(line), status) != nullptr) {
-            if (sscanf(line, "VmRSS: %ld kB", &kib) == 1) break;
-        }
-        fclose(status);
-        return kib;
-    }
+    long HelperRssKib() { return ResidentKib(pid_); }
 
     static void WaitForHangUp(const vyr_test::RawPeer& peer) {
         auto deadline = std::chrono::steady_clock::now() + 10s;

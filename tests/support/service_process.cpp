@@ -111,12 +111,7 @@ bool ServiceProcess::WaitForLog(const std::string& text, milliseconds timeout) c
 }
 
 long ServiceProcess::RssKib() const {
-    std::ifstream status("/proc/" + std::to_string(pid()) + "/status");
-    std::string line;
-    while (std::getline(status, line)) {
-        if (line.rfind("VmRSS:", 0) == 0) return std::strtol(line.c_str() + 6, nullptr, 10);
-    }
-    return -1;
+    return ResidentKib(pid());
 }
 
 size_t ServiceProcess::LogCount(const std::string& text) const {

@@ -8,6 +8,7 @@
 #include <stdlib.h>
 #include <unistd.h>
 
+#include <cstdio>
 #include <fstream>
 #include <sstream>
 #include <vector>
@@ -49,6 +50,15 @@ std::map<std::string, std::string> ReadKeyValues(const std::string& path) {
         if (equals != std::string::npos) values[line.substr(0, equals)] = line.substr(equals + 1);
     }
     return values;
+}
+
+long ResidentKib(pid_t pid) {
+    for (const std::string& line :
+         SplitLines(ReadFile("/proc/" + std::to_string(pid) + "/status"))) {
+        long kib = 0;
+        if (sscanf(line.c_str(), "VmRSS: %ld kB", &kib) == 1) return kib;
+    }
+    return -1;
 }
 
 std::string ProgramBesideThisOne(const std::string& name) {

@@ -4,7 +4,10 @@
 #pragma once
 
 // Files of tests and tools: a private temporary directory, a whole file as text, as lines or as
-// `key=value` lines, and the programs installed beside a test.
+// `key=value` lines, a process's resident memory from /proc, and the programs installed beside a
+// test.
+
+#include <sys/types.h>
 
 #include <map>
 #include <string>
@@ -21,6 +24,8 @@ std::string ReadFile(const std::string& path);
 std::vector<std::string> SplitLines(const std::string& text);
 // The `key=value` lines of a file, by key; empty when it cannot be read.
 std::map<std::string, std::string> ReadKeyValues(const std::string& path);
+// Resident memory of process `pid`, in KiB; -1 when unknown.
+long ResidentKib(pid_t pid);
 // The program `name` in the folder of the running one, where a device's test installs the
 // programs it starts.
 std::string ProgramBesideThisOne(const std::string& name);
