@@ -13,7 +13,7 @@
 
 #include "ignoring_callback.h"
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -55,4 +55,4 @@ int RunAbusiveClient(int mode, bool with_callback) {
     }
 }
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

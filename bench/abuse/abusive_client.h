@@ -8,7 +8,7 @@
 
 #include <string>
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 
 // Steps, in the order a client reaches them.
 constexpr const char* kSteps[] = {"started", "opened", "callback", "enabled", "polling"};
@@ -18,4 +18,4 @@ constexpr const char* kSteps[] = {"started", "opened", "callback", "enabled", "p
 // on failure.
 int RunAbusiveClient(int mode, bool with_callback);
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

@@ -5,7 +5,7 @@
 
 #include <chrono>
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 
 using aidl::android::vyr::Event;
 
@@ -49,4 +49,4 @@ void HonestClients::Run(int index) {
     }
 }
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

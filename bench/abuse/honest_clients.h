@@ -15,7 +15,7 @@
 
 #include "latencies.h"
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 
 class HonestClients {
   public:
@@ -40,4 +40,4 @@ class HonestClients {
     std::vector<std::thread> threads_;
 };
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

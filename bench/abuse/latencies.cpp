@@ -7,7 +7,7 @@
 #include <cmath>
 #include <cstdio>
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 
 void Latencies::Add(std::chrono::nanoseconds duration) {
     std::lock_guard<std::mutex> lock(mutex_);
@@ -36,4 +36,4 @@ std::string Latencies::Summary() {
     return text;
 }
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

@@ -10,7 +10,7 @@
 #include <string>
 #include <vector>
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 
 class Latencies {
   public:
@@ -26,4 +26,4 @@ class Latencies {
     std::vector<int64_t> nanos_;
 };
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

@@ -40,9 +40,9 @@ int Usage() {
 
 int main(int argc, char** argv) {
     if (argc == 4 && strcmp(argv[1], "--client") == 0) {
-        return vyr_abuse::RunAbusiveClient(atoi(argv[2]), strcmp(argv[3], "callback") == 0);
+        return vyr_bench::abuse::RunAbusiveClient(atoi(argv[2]), strcmp(argv[3], "callback") == 0);
     }
-    vyr_abuse::Options options;
+    vyr_bench::abuse::Options options;
     options.service_binary = VYRSERVICE_PATH;
     options.self = SelfPath();
     std::vector<std::string> scenarios;
@@ -72,9 +72,9 @@ int main(int argc, char** argv) {
     for (const std::string& scenario : scenarios) {
         printf("\n== %s\n", scenario.c_str());
         fflush(stdout);
-        int rc = scenario == "soak"      ? vyr_abuse::RunSoak(options)
-                 : scenario == "headers" ? vyr_abuse::RunHeaders(options)
-                                         : vyr_abuse::RunStalled(options);
+        int rc = scenario == "soak"      ? vyr_bench::abuse::RunSoak(options)
+                 : scenario == "headers" ? vyr_bench::abuse::RunHeaders(options)
+                                         : vyr_bench::abuse::RunStalled(options);
         fflush(stdout);
         failed |= rc;
     }

@@ -5,10 +5,9 @@
 
 #include <dirent.h>
 
-#include <cstdlib>
-#include <fstream>
+#include "test_files.h"
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 namespace {
 
 long CountEntries(const std::string& dir_path) {
@@ -27,11 +26,7 @@ long CountEntries(const std::string& dir_path) {
 ProcessStats ProcessStats::Of(pid_t pid) {
     const std::string proc = "/proc/" + std::to_string(pid);
     ProcessStats stats;
-    std::ifstream status(proc + "/status");
-    for (std::string line; std::getline(status, line);) {
-        if (line.rfind("VmRSS:", 0) == 0)
-            stats.rss_kib = std::strtol(line.c_str() + 6, nullptr, 10);
-    }
+    stats.rss_kib = vyr_test::ResidentKib(pid);
     stats.fds = CountEntries(proc + "/fd");
     stats.threads = CountEntries(proc + "/task");
     return stats;
@@ -42,4 +37,4 @@ std::string ProcessStats::ToString() const {
            std::to_string(threads) + " threads";
 }
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

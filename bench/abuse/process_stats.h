@@ -9,7 +9,7 @@
 
 #include <string>
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 
 struct ProcessStats {
     long rss_kib = -1;
@@ -20,4 +20,4 @@ struct ProcessStats {
     std::string ToString() const;
 };
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

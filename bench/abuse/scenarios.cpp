@@ -19,7 +19,7 @@
 #include "raw_peer.h"
 #include "service_process.h"
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -218,4 +218,4 @@ int RunStalled(const Options& options) {
     return Verdict(&process);
 }
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

@@ -8,7 +8,7 @@
 
 #include <string>
 
-namespace vyr_abuse {
+namespace vyr_bench::abuse {
 
 struct Options {
     std::string service_binary;
@@ -28,4 +28,4 @@ int RunHeaders(const Options& options);
 // Honest calls with and without a peer that sends calls and never reads the replies.
 int RunStalled(const Options& options);
 
-}  // namespace vyr_abuse
+}  // namespace vyr_bench::abuse

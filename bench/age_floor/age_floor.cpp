@@ -13,8 +13,6 @@
 // Prints "p50 X ms, p99 Y ms (N events)".
 #include <android-base/file.h>
 #include <poll.h>
-#include <sys/socket.h>
-#include <sys/wait.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -24,11 +22,13 @@
 #include <condition_variable>
 #include <cstdint>
 #include <cstdio>
-#include <cstdlib>
 #include <cstring>
 #include <mutex>
 #include <thread>
 #include <vector>
+
+#include "flags.h"
+#include "peers.h"
 
 namespace {
 
@@ -121,33 +121,17 @@ void Sender(int fd, std::vector<int64_t>* ages) {
 
 int main(int argc, char** argv) {
     Options options;
-    for (int i = 1; i + 1 < argc; i += 2) {
-        if (strcmp(argv[i], "--clients") == 0) {
-            options.clients = atoi(argv[i + 1]);
-        } else if (strcmp(argv[i], "--period-ms") == 0) {
-            options.period_ms = atoi(argv[i + 1]);
-        } else if (strcmp(argv[i], "--seconds") == 0) {
-            options.seconds = atof(argv[i + 1]);
-        } else {
-            fprintf(stderr, "unknown option %s\n", argv[i]);
-            return 2;
-        }
-    }
+    if (!vyr_bench::ParseFlags(argc, argv,
+                               {{"--clients", &options.clients},
+                                {"--period-ms", &options.period_ms},
+                                {"--seconds", &options.seconds}}))
+        return 2;
     if (options.clients < 1 || options.period_ms < 1 || options.seconds <= 0) {
         fprintf(stderr, "usage: bench_age_floor [--clients N] [--period-ms P] [--seconds S]\n");
         return 2;
     }
-    std::vector<int> fds;
-    for (int i = 0; i < options.clients; ++i) {
-        int pair[2];
-        if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, pair) != 0) return 1;
-        if (fork() == 0) {
-            close(pair[0]);
-            Echo(pair[1]);
-        }
-        close(pair[1]);
-        fds.push_back(pair[0]);
-    }
+    const std::vector<int> fds = vyr_bench::ForkPeers(options.clients, Echo);
+    if (fds.empty()) return 1;
     std::vector<std::vector<int64_t>> ages(options.clients);
     std::vector<std::thread> threads;
     threads.emplace_back(Sensor, std::cref(options));
@@ -163,9 +147,7 @@ int main(int argc, char** argv) {
     }
     g_sample_cv.notify_all();
     for (std::thread& thread : threads) thread.join();
-    for (int fd : fds) close(fd);
-    while (wait(nullptr) > 0) {
-    }
+    vyr_bench::EndPeers(fds);
     std::vector<int64_t> all;
     for (const auto& client : ages) all.insert(all.end(), client.begin(), client.end());
     if (all.empty()) {

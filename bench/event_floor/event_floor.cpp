@@ -11,8 +11,6 @@
 // Prints the process's CPU time per event delivered.
 #include <android-base/file.h>
 #include <poll.h>
-#include <sys/socket.h>
-#include <sys/wait.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -20,11 +18,12 @@
 #include <chrono>
 #include <condition_variable>
 #include <cstdio>
-#include <cstdlib>
-#include <cstring>
 #include <mutex>
 #include <thread>
 #include <vector>
+
+#include "flags.h"
+#include "peers.h"
 
 namespace {
 
@@ -114,20 +113,12 @@ double CpuSeconds() {
 
 int main(int argc, char** argv) {
     Options options;
-    for (int i = 1; i + 1 < argc; i += 2) {
-        if (strcmp(argv[i], "--clients") == 0) {
-            options.clients = atoi(argv[i + 1]);
-        } else if (strcmp(argv[i], "--period-ms") == 0) {
-            options.period_ms = atoi(argv[i + 1]);
-        } else if (strcmp(argv[i], "--frame-hz") == 0) {
-            options.frame_hz = atoi(argv[i + 1]);
-        } else if (strcmp(argv[i], "--seconds") == 0) {
-            options.seconds = atof(argv[i + 1]);
-        } else {
-            fprintf(stderr, "unknown option %s\n", argv[i]);
-            return 2;
-        }
-    }
+    if (!vyr_bench::ParseFlags(argc, argv,
+                               {{"--clients", &options.clients},
+                                {"--period-ms", &options.period_ms},
+                                {"--frame-hz", &options.frame_hz},
+                                {"--seconds", &options.seconds}}))
+        return 2;
     if (options.clients < 1 || options.period_ms < 1 || options.frame_hz < 1 ||
         options.seconds <= 0) {
         fprintf(stderr,
@@ -135,17 +126,8 @@ int main(int argc, char** argv) {
                 "[--seconds S]\n");
         return 2;
     }
-    std::vector<int> fds;
-    for (int i = 0; i < options.clients; ++i) {
-        int pair[2];
-        if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, pair) != 0) return 1;
-        if (fork() == 0) {
-            close(pair[0]);
-            Echo(pair[1]);
-        }
-        close(pair[1]);
-        fds.push_back(pair[0]);
-    }
+    const std::vector<int> fds = vyr_bench::ForkPeers(options.clients, Echo);
+    if (fds.empty()) return 1;
     std::vector<std::thread> threads;
     threads.emplace_back(Sensor, std::cref(options));
     for (int i = 0; i < options.clients; ++i) {
@@ -161,9 +143,7 @@ int main(int argc, char** argv) {
     const long events = g_events.load() - events0;
     g_stop = true;
     for (std::thread& thread : threads) thread.join();
-    for (int fd : fds) close(fd);
-    while (wait(nullptr) > 0) {
-    }
+    vyr_bench::EndPeers(fds);
     if (events == 0) {
         printf("no events\n");
         return 1;

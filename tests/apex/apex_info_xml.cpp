@@ -3,7 +3,7 @@
 
 #include "apex_info_xml.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 std::string Entry(const Attributes& attributes) {
     std::string entry = "    <apex-info";
@@ -51,7 +51,7 @@ std::vector<InfoFields> Fields(const std::set<ApexUpdateListener::Info>& infos) 
     return fields;
 }
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex
 
 void PrintTo(const ApexUpdateListener::Info& info, std::ostream* os) {
     *os << "{module_name=\"" << info.module_name << "\" module_path=\"" << info.module_path

@@ -13,7 +13,7 @@
 #include <utility>
 #include <vector>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 inline constexpr char kPackage[] = "com.tarven.nomil.camera.hal";
 inline constexpr char kOtherPackage[] = "com.android.media.swcodec";
@@ -36,6 +36,6 @@ using InfoFields =
 InfoFields Fields(const ApexUpdateListener::Info& info);
 std::vector<InfoFields> Fields(const std::set<ApexUpdateListener::Info>& infos);
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex
 
 void PrintTo(const ApexUpdateListener::Info& info, std::ostream* os);

@@ -3,7 +3,7 @@
 
 #include "callback_recorder.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 ApexUpdateListener::Callback CallbackRecorder::AsCallback() {
     return [this](const std::set<ApexUpdateListener::Info>& old_info,
@@ -24,4 +24,4 @@ std::vector<CallbackRecorder::Call> CallbackRecorder::Calls() const {
     return calls_;
 }
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -12,7 +12,7 @@
 #include <thread>
 #include <vector>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 // Collects the listener's callbacks, which arrive on the listener thread.
 class CallbackRecorder {
@@ -36,4 +36,4 @@ class CallbackRecorder {
     std::vector<Call> calls_;
 };
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -11,7 +11,7 @@
 #include <cerrno>
 #include <cstring>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 EventFeed::EventFeed() {
     int ends[2];
@@ -62,4 +62,4 @@ void EventFeed::Close() {
     test_end_ = -1;
 }
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 // A socket pair standing in for an inotify instance: every Send arrives as one read of the
 // listener's end, so tests choose exactly which event records a read returns.
@@ -33,4 +33,4 @@ class EventFeed {
     int test_end_ = -1;
 };
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -20,7 +20,7 @@
 #include "file_read_observer.h"
 #include "temp_info_list.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 namespace {
 
 using Info = ApexUpdateListener::Info;
@@ -234,4 +234,4 @@ TEST(EventReadFailureTest, FailedReadIsLoggedAndEndsTheThread) {
 }
 
 }  // namespace
-}  // namespace apex_test
+}  // namespace vyr_test::apex

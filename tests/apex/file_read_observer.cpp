@@ -11,7 +11,7 @@
 #include <cerrno>
 #include <cstring>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 FileReadObserver::FileReadObserver(const std::string& path) {
     fd_ = inotify_init1(IN_NONBLOCK | IN_CLOEXEC);
@@ -65,4 +65,4 @@ bool FileReadObserver::WaitForRead(std::chrono::milliseconds timeout) {
     return true;
 }
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

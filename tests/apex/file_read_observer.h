@@ -6,7 +6,7 @@
 #include <chrono>
 #include <string>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 // Tells when a reader has finished reading a file: the listener's re-read closes the file it
 // opened read-only, which is the moment its result is settled.
@@ -30,4 +30,4 @@ class FileReadObserver {
     bool Collect();
 };
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -13,6 +13,7 @@
 #include <cstring>
 #include <string>
 
+namespace vyr_test::apex {
 namespace {
 
 constexpr char kPackage[] = "com.tarven.nomil.camera.hal";
@@ -40,8 +41,10 @@ void SetUp() {
 }
 
 }  // namespace
+}  // namespace vyr_test::apex
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+    using namespace vyr_test::apex;
     if (g_path == nullptr) SetUp();
     int fd = open(g_path->c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600);
     if (fd < 0) abort();

@@ -13,7 +13,7 @@
 
 #include "apex_info_xml.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 namespace {
 
 using Info = ApexUpdateListener::Info;
@@ -139,4 +139,4 @@ TEST(InfoOrderTest, SetCollapsesEquivalentRecordsAndKeepsOrder) {
 }
 
 }  // namespace
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -9,7 +9,7 @@
 #include <cstdlib>
 #include <string>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 std::set<int> InotifyDescriptors() {
     std::set<int> result;
@@ -28,4 +28,4 @@ std::set<int> InotifyDescriptors() {
     return result;
 }
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -5,9 +5,9 @@
 
 #include <set>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 // The process's open inotify instances, by descriptor.
 std::set<int> InotifyDescriptors();
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -21,7 +21,7 @@
 #include "inotify_descriptors.h"
 #include "temp_info_list.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 namespace {
 
 using Info = ApexUpdateListener::Info;
@@ -225,4 +225,4 @@ TEST_F(ListenerLiveTest, DestructionWithNothingPendingIsPromptAndSilent) {
 }
 
 }  // namespace
-}  // namespace apex_test
+}  // namespace vyr_test::apex

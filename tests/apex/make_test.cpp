@@ -19,7 +19,7 @@
 #include "inotify_descriptors.h"
 #include "temp_info_list.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 namespace {
 
 using Info = ApexUpdateListener::Info;
@@ -167,4 +167,4 @@ TEST_F(MakeTest, InitialVersionIsReportedBeforeMakeReturns) {
 }
 
 }  // namespace
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -13,7 +13,7 @@
 #include "apex_info_xml.h"
 #include "temp_info_list.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 namespace {
 
 using namespace std::chrono_literals;
@@ -44,4 +44,4 @@ TEST(ApexRestartDeathTest, ChangeOfThePackageExitsWithStatusZero) {
 }
 
 }  // namespace
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -12,7 +12,7 @@
 #include <cstring>
 #include <vector>
 
-namespace apex_test {
+namespace vyr_test::apex {
 namespace {
 
 // A device has no /tmp; its shell and test runners write under /data/local/tmp.
@@ -64,4 +64,4 @@ bool TempInfoList::Write(const std::string& content) {
     return true;
 }
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

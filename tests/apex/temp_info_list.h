@@ -5,7 +5,7 @@
 
 #include <string>
 
-namespace apex_test {
+namespace vyr_test::apex {
 
 // An info list file in a fresh temporary directory, removed with it.
 class TempInfoList {
@@ -29,4 +29,4 @@ class TempInfoList {
     size_t size_ = 0;
 };
 
-}  // namespace apex_test
+}  // namespace vyr_test::apex

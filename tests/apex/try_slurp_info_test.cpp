@@ -16,7 +16,7 @@
 #include "apex_info_xml.h"
 #include "temp_info_list.h"
 
-namespace apex_test {
+namespace vyr_test::apex {
 namespace {
 
 using Info = ApexUpdateListener::Info;
@@ -300,4 +300,4 @@ TEST_F(TrySlurpInfoTest, DirectoryFails) {
 }
 
 }  // namespace
-}  // namespace apex_test
+}  // namespace vyr_test::apex

@@ -9,7 +9,7 @@
 
 #include "test_files.h"
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 
 ScopedRegistryDir::ScopedRegistryDir() {
     path_ = vyr_test::MakeTempDir("vyr-binder-test-");
@@ -22,4 +22,4 @@ ScopedRegistryDir::~ScopedRegistryDir() {
     if (!path_.empty()) std::filesystem::remove_all(path_, ignored);
 }
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

@@ -5,7 +5,7 @@
 
 #include <string>
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 
 // A fresh registry directory for one test, set as VYR_BINDER_DIR; removed by the destructor.
 class ScopedRegistryDir {
@@ -21,4 +21,4 @@ class ScopedRegistryDir {
     std::string path_;
 };
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

@@ -18,6 +18,7 @@
 #include "process_state.h"
 #include "wire.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using namespace std::chrono_literals;
@@ -59,3 +60,4 @@ TEST(ConnectionTest, APeerThatHangsUpRightAfterItsLastFrameIsDropped) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder

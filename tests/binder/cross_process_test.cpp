@@ -33,20 +33,17 @@
 #include "frame_io.h"
 #include "process_fixture.h"
 #include "raw_peer.h"
+#include "test_files.h"
 #include "test_service.h"
 #include "thread_count.h"
 #include "wire.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 using aidl::android::vyr::IVYRService;
-using vyr_binder_test::CrossProcessTest;
-using vyr_binder_test::DeathLog;
-using vyr_binder_test::Eventually;
-using vyr_binder_test::RecordingCallback;
-using vyr_binder_test::TestService;
 using namespace std::chrono_literals;
 
 TEST_F(CrossProcessTest, CallsReachTheOtherProcess) {
@@ -151,11 +148,11 @@ TEST_F(CrossProcessTest, APeerThatHoldsNothingOfOursReportsItsDeath) {
 TEST_F(CrossProcessTest, CallingIdentityComesFromThePeer) {
     StartServer("vyr.test");
     ndk::SpAIBinder echo = WaitForService("vyr.test.echo");
-    ASSERT_TRUE(AIBinder_associateClass(echo.get(), vyr_binder_test::EchoClass()));
+    ASSERT_TRUE(AIBinder_associateClass(echo.get(), vyr_test::binder::EchoClass()));
     AParcel* in = nullptr;
     AParcel* out = nullptr;
     ASSERT_EQ(STATUS_OK, AIBinder_prepareTransaction(echo.get(), &in));
-    ASSERT_EQ(STATUS_OK, AIBinder_transact(echo.get(), vyr_binder_test::kIdentity, &in, &out, 0));
+    ASSERT_EQ(STATUS_OK, AIBinder_transact(echo.get(), vyr_test::binder::kIdentity, &in, &out, 0));
     ndk::ScopedAParcel reply(out);
     int32_t uid = -1;
     int32_t pid = -1;
@@ -176,9 +173,9 @@ TEST_F(CrossProcessTest, OneAIBinderPerObjectAndOwnObjectsComeBackLocal) {
     EXPECT_EQ(service->asBinder().get(), first.get());
 
     ndk::SpAIBinder echo = WaitForService("vyr.test.echo");
-    ASSERT_TRUE(AIBinder_associateClass(echo.get(), vyr_binder_test::EchoClass()));
+    ASSERT_TRUE(AIBinder_associateClass(echo.get(), vyr_test::binder::EchoClass()));
     // The IVYRService object does not answer to the echo interface.
-    EXPECT_FALSE(AIBinder_associateClass(first.get(), vyr_binder_test::EchoClass()));
+    EXPECT_FALSE(AIBinder_associateClass(first.get(), vyr_test::binder::EchoClass()));
 
     auto roundtrip = [&](AIBinder* sent) {
         AParcel* in = nullptr;
@@ -186,7 +183,7 @@ TEST_F(CrossProcessTest, OneAIBinderPerObjectAndOwnObjectsComeBackLocal) {
         EXPECT_EQ(STATUS_OK, AIBinder_prepareTransaction(echo.get(), &in));
         EXPECT_EQ(STATUS_OK, AParcel_writeStrongBinder(in, sent));
         EXPECT_EQ(STATUS_OK,
-                  AIBinder_transact(echo.get(), vyr_binder_test::kEchoBinder, &in, &out, 0));
+                  AIBinder_transact(echo.get(), vyr_test::binder::kEchoBinder, &in, &out, 0));
         ndk::ScopedAParcel reply(out);
         ndk::SpAIBinder back;
         EXPECT_EQ(STATUS_OK, AParcel_readStrongBinder(reply.get(), back.getR()));
@@ -600,7 +597,7 @@ TEST_F(MalformedFrameTest, CallToUnknownObjectIsAnsweredDeadObject) {
 }
 
 // The dump transaction: a descriptor and arguments from the caller to the service's dump.
-class DumpTest : public MalformedFrameTest {
+class DumpTransactionTest : public MalformedFrameTest {
   protected:
     // Runs a dump into a pipe and returns its status; the text read is left in `text`.
     binder_status_t Dump(const std::vector<const char*>& args, std::string* text) {
@@ -627,7 +624,7 @@ class DumpTest : public MalformedFrameTest {
     }
 };
 
-TEST_F(DumpTest, TheServiceWritesToTheCallersDescriptorWithItsArguments) {
+TEST_F(DumpTransactionTest, TheServiceWritesToTheCallersDescriptorWithItsArguments) {
     std::string text;
     EXPECT_EQ(STATUS_OK, Dump({"--json", "two words"}, &text));
     EXPECT_EQ("dump: --json two words\n", text);
@@ -636,7 +633,7 @@ TEST_F(DumpTest, TheServiceWritesToTheCallersDescriptorWithItsArguments) {
     ExpectStillServing();
 }
 
-TEST_F(DumpTest, BadDescriptorsAreRefusedAndTheServiceServesOn) {
+TEST_F(DumpTransactionTest, BadDescriptorsAreRefusedAndTheServiceServesOn) {
     EXPECT_EQ(STATUS_BAD_VALUE, AIBinder_dump(service_->asBinder().get(), -1, nullptr, 0));
     int fds[2];
     ASSERT_EQ(0, pipe(fds));
@@ -652,7 +649,7 @@ TEST_F(DumpTest, BadDescriptorsAreRefusedAndTheServiceServesOn) {
     ExpectStillServing();
 }
 
-TEST_F(DumpTest, AReaderThatClosesEarlyCostsTheServiceNothing) {
+TEST_F(DumpTransactionTest, AReaderThatClosesEarlyCostsTheServiceNothing) {
     int fds[2];
     ASSERT_EQ(0, pipe2(fds, O_CLOEXEC));
     // The reader takes the first line and goes; the rest of the 4 MiB has nowhere to go.
@@ -669,7 +666,7 @@ TEST_F(DumpTest, AReaderThatClosesEarlyCostsTheServiceNothing) {
     ExpectStillServing();
 }
 
-TEST_F(DumpTest, ADumpRacingTheServicesDeathEndsWithTheDeathNotice) {
+TEST_F(DumpTransactionTest, ADumpRacingTheServicesDeathEndsWithTheDeathNotice) {
     ndk::ScopedAIBinder_DeathRecipient recipient(AIBinder_DeathRecipient_new(DeathLog::OnDied));
     int cookie = 0;
     ASSERT_EQ(STATUS_OK, AIBinder_linkToDeath(service_->asBinder().get(), recipient.get(), &cookie));
@@ -716,17 +713,7 @@ class PeerLimitTest : public MalformedFrameTest {
     }
 
     // Resident memory of the helper, in KiB.
-    long HelperRssKib() {
-        FILE* status = fopen(("/proc/" + std::to_string(pid_) + "/status").c_str(), "r");
-        if (status == nullptr) return -1;
-        char line[256];
-        long kib = -1;
-        while (fgets(line, sizeof(line), status) != nullptr) {
-            if (sscanf(line, "VmRSS: %ld kB", &kib) == 1) break;
-        }
-        fclose(status);
-        return kib;
-    }
+    long HelperRssKib() { return ResidentKib(pid_); }
 
     static void WaitForHangUp(const vyr_test::RawPeer& peer) {
         auto deadline = std::chrono::steady_clock::now() + 10s;
@@ -826,3 +813,4 @@ TEST_F(PeerLimitTest, APeerWhoseUnreadRepliesPileUpIsDropped) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder

@@ -3,7 +3,7 @@
 
 #include "echo_binder.h"
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 namespace {
 
 void* OnCreate(void* args) {
@@ -43,4 +43,4 @@ ndk::SpAIBinder MakeEcho() {
     return ndk::SpAIBinder(AIBinder_new(EchoClass(), nullptr));
 }
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

@@ -6,7 +6,7 @@
 #include <android/binder_auto_utils.h>
 #include <android/binder_ibinder.h>
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 
 // A hand-written binder class: kEchoBinder sends back the binder it receives, kIdentity replies
 // with the caller's uid and pid as the runtime reports them.
@@ -16,4 +16,4 @@ constexpr transaction_code_t kIdentity = FIRST_CALL_TRANSACTION + 1;
 const AIBinder_Class* EchoClass();
 ndk::SpAIBinder MakeEcho();
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

@@ -19,6 +19,7 @@
 #include "thread_count.h"
 #include "wire.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using vyr_binder::BufferedBytes;
@@ -188,3 +189,4 @@ TEST(FrameBufferTest, BuffersOfAllConnectionsStayUnderTheProcessLimit) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder

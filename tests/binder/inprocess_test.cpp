@@ -11,12 +11,11 @@
 #include "binder_test_env.h"
 #include "test_service.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using aidl::android::vyr::BpVYRService;
 using aidl::android::vyr::IVYRService;
-using vyr_binder_test::RecordingCallback;
-using vyr_binder_test::TestService;
 
 TEST(InProcessTest, FromBinderOfLocalBinderIsTheLocalObject) {
     auto service = ndk::SharedRefBase::make<TestService>();
@@ -133,7 +132,7 @@ TEST(InProcessTest, DeathLinksOnLocalBinderAreRefused) {
 }
 
 TEST(InProcessTest, ServiceLookedUpInItsOwnProcessIsTheLocalObject) {
-    vyr_binder_test::ScopedRegistryDir registry;
+    vyr_test::binder::ScopedRegistryDir registry;
     auto service = ndk::SharedRefBase::make<TestService>();
     ASSERT_EQ(EX_NONE, AServiceManager_addService(service->asBinder().get(), "inprocess.test"));
     ndk::SpAIBinder found(AServiceManager_checkService("inprocess.test"));
@@ -171,3 +170,4 @@ TEST(InProcessTest, StatusHelpers) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder

@@ -23,16 +23,12 @@
 #include "process_fixture.h"
 #include "test_service.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 using aidl::android::vyr::IVYRService;
-using vyr_binder_test::CrossProcessTest;
-using vyr_binder_test::DeathLog;
-using vyr_binder_test::Eventually;
-using vyr_binder_test::RecordingCallback;
-using vyr_binder_test::TestService;
 using namespace std::chrono_literals;
 
 // A oneway transaction of int32 arguments, as a generated proxy sends one.
@@ -474,3 +470,4 @@ TEST_F(CrossProcessTest, CallInFlightFailsAtOnceWhenThePeerDies) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder

@@ -14,6 +14,7 @@
 
 #include "echo_binder.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -271,7 +272,7 @@ TEST_F(ParcelTest, NullBinderRoundTripAndBadObjectIndex) {
 }
 
 TEST_F(ParcelTest, LocalBinderRoundTripHoldsAReference) {
-    ndk::SpAIBinder binder = vyr_binder_test::MakeEcho();
+    ndk::SpAIBinder binder = vyr_test::binder::MakeEcho();
     AParcel* p = parcel_.get();
     ASSERT_EQ(STATUS_OK, AParcel_writeStrongBinder(p, binder.get()));
     ASSERT_EQ(STATUS_OK, AParcel_writeStrongBinder(p, binder.get()));
@@ -303,3 +304,4 @@ TEST_F(ParcelTest, FileDescriptorsAreRefused) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder

@@ -18,7 +18,7 @@
 
 extern char** environ;
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 namespace {
 
 // The helper: named by the build on the host, installed beside the test on a device.
@@ -118,4 +118,4 @@ std::shared_ptr<aidl::android::vyr::IVYRService> CrossProcessTest::StartServer(
     return aidl::android::vyr::IVYRService::fromBinder(WaitForService(name));
 }
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

@@ -21,7 +21,7 @@
 
 #include "binder_test_env.h"
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 
 using namespace std::chrono_literals;
 
@@ -68,4 +68,4 @@ class CrossProcessTest : public ::testing::Test {
     std::vector<pid_t> children_;
 };
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

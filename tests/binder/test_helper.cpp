@@ -27,16 +27,15 @@
 #include "echo_binder.h"
 #include "test_service.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using aidl::android::vyr::IVYRService;
-using vyr_binder_test::RecordingCallback;
-using vyr_binder_test::TestService;
 
 int Serve(const std::string& name) {
     auto service = ndk::SharedRefBase::make<TestService>();
     if (AServiceManager_addService(service->asBinder().get(), name.c_str()) != EX_NONE) return 2;
-    ndk::SpAIBinder echo = vyr_binder_test::MakeEcho();
+    ndk::SpAIBinder echo = vyr_test::binder::MakeEcho();
     if (AServiceManager_addService(echo.get(), (name + ".echo").c_str()) != EX_NONE) return 2;
     ABinderProcess_startThreadPool();
     ABinderProcess_joinThreadPool();
@@ -120,8 +119,10 @@ int LatePool(const std::string& name) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder
 
 int main(int argc, char** argv) {
+    using namespace vyr_test::binder;
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
     if (argc == 3 && strcmp(argv[1], "nopool") == 0) return NoPool(argv[2]);

@@ -11,7 +11,7 @@
 #include <chrono>
 #include <string>
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 
 TestService::~TestService() {
     for (std::thread& sender : senders_) sender.join();
@@ -186,4 +186,4 @@ binder_status_t TestService::dump(int fd, const char** args, uint32_t num_args) 
     return STATUS_OK;
 }
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

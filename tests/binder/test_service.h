@@ -12,7 +12,7 @@
 #include <thread>
 #include <vector>
 
-namespace vyr_binder_test {
+namespace vyr_test::binder {
 
 using aidl::android::vyr::BnEventCallback;
 using aidl::android::vyr::BnVYRService;
@@ -83,4 +83,4 @@ class RecordingCallback : public BnEventCallback {
 // The event PollOnce(handle) returns.
 Event MakeEvent(int32_t handle);
 
-}  // namespace vyr_binder_test
+}  // namespace vyr_test::binder

@@ -30,6 +30,7 @@
 #include <string>
 #include <thread>
 
+namespace vyr_test::client {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -190,8 +191,10 @@ class FakeService : public aidl::android::vyr::BnVYRService {
 };
 
 }  // namespace
+}  // namespace vyr_test::client
 
 int main(int argc, char** argv) {
+    using namespace vyr_test::client;
     int32_t first_handle = 1;
     int refusals = 0;
     bool absent = false;

@@ -31,13 +31,13 @@
 #include "test_service.h"
 #include "thread_count.h"
 
+namespace vyr_test::client {
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
 using vyr::SensorClient;
-using vyr_test::ChildProcess;
 
 constexpr milliseconds kWait{10000};
 // The real service waits 4 s before it registers; sanitizer builds start slower still.
@@ -391,7 +391,7 @@ TEST_F(SensorClientTest, AFailedStartLeavesNothingOpenAndMayBeTriedAgain) {
 // A binder of this process cannot be linked to: the runtime reports the link gone inside the
 // failed call, and the cookie is freed there once (AddressSanitizer tells a second free).
 TEST_F(SensorClientTest, AServiceThatCannotBeLinkedIsRefusedWithoutADoubleFree) {
-    auto local = ndk::SharedRefBase::make<vyr_binder_test::TestService>();
+    auto local = ndk::SharedRefBase::make<vyr_test::binder::TestService>();
     SensorClient client(RangeSettings(), &recorder_, QuickPolicy());
     EXPECT_EQ(client.Start(local), SensorClient::kNotAttached);
     EXPECT_EQ(client.state(), SensorClient::State::kIdle);
@@ -500,3 +500,4 @@ TEST_F(StreamAcrossRestartTest, NoReconnectEndsWithAnError) {
 }
 
 }  // namespace
+}  // namespace vyr_test::client

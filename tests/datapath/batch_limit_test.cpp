@@ -15,11 +15,10 @@
 #include "event_parcel.h"
 #include "recording_callback.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
-using vyr_test::RecordingCallback;
 
 // libbinder's buffer: 1 MiB less two pages.
 constexpr size_t kBufferBytes = (size_t{1} << 20) - 2 * 4096;
@@ -68,4 +67,4 @@ TEST_F(BatchLimitTest, ABatchTheClientsBufferRefusesIsSplitAndDeliveredWhole) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -3,16 +3,18 @@
 
 // SetCallback and the notification loop that pushes each new sample to a client's callback.
 
+#include <aidl/android/vyr/Event.h>
 #include <android/log.h>
 
 #include <chrono>
 #include <thread>
 #include <vector>
 
-#include "in_process_service.h"
+#include "data_path_fixture.h"
 #include "recording_callback.h"
+#include "vyrservice_test_peer.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -31,20 +33,12 @@ MultiRangingData Frame(uint32_t time_ms) {
     return data;
 }
 
-class CallbackTest : public InProcessServiceTest {
-  protected:
-    std::shared_ptr<RecordingCallback> SetCallbackOk(int32_t handle) {
-        auto callback = NewCallback();
-        int32_t result = 1;
-        EXPECT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
-        EXPECT_EQ(result, 0);
-        return callback;
-    }
-};
+using CallbackTest = DataPathTest;
 
 TEST_F(CallbackTest, CallbackOfAnEnabledClientCannotBeReplaced) {
     sensor_doubles::SetRangeData(Frame(1));
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     auto first = SetCallbackOk(handle);
     StartHeldSampling(handle, kRange);
     ASSERT_TRUE(first->WaitForEvents(1, kWait));
@@ -65,21 +59,22 @@ TEST_F(CallbackTest, CallbackOfAnEnabledClientCannotBeReplaced) {
     EXPECT_EQ(second->Count(), 0u);
 
     // Once disabled, the callback may be replaced and the new one is used at the next enable.
-    DisableNow(handle);
+    Disable(handle);
     EXPECT_TRUE(service_->SetCallback(handle, second, &result).isOk());
     EXPECT_EQ(result, 0);
     sensor_doubles::Reset();
     WaitForIdleWorkers();
     sensor_doubles::SetRangeData(Frame(3));
     size_t first_count = first->Count();
-    EnableOk(handle, 1);
+    EXPECT_EQ(0, Enable(handle, 1));
     ASSERT_TRUE(second->WaitForEvents(1, kWait));
     EXPECT_EQ(second->Events()[0].timestamp, 3);
     EXPECT_EQ(first->Count(), first_count);
 }
 
 TEST_F(CallbackTest, EachSampleIsPushedOnce) {
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(handle);
     sensor_doubles::SetRangeData(Frame(1));
     StartHeldSampling(handle, kRange);
@@ -100,10 +95,11 @@ TEST_F(CallbackTest, EachSampleIsPushedOnce) {
 
 TEST_F(CallbackTest, ClientWithoutCallbackGetsNoNotificationThread) {
     sensor_doubles::SetRangeData(Frame(1));
-    int32_t pusher = OpenOk(kRange);
-    int32_t poller = OpenOk(kRange);
+    int32_t pusher = Open(kRange);
+    int32_t poller = Open(kRange);
+    for (int32_t handle : {pusher, poller}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
-    EnableOk(poller, 1);
+    EXPECT_EQ(0, Enable(poller, 1));
     StartHeldSampling(pusher, kRange);
     ASSERT_TRUE(callback->WaitForEvents(1, kWait));
 
@@ -114,7 +110,8 @@ TEST_F(CallbackTest, ClientWithoutCallbackGetsNoNotificationThread) {
 }
 
 TEST_F(CallbackTest, FailingCallbackKeepsReceivingNewSamples) {
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(handle);
     callback->SetFailing(true);
     sensor_doubles::SetRangeData(Frame(1));
@@ -129,14 +126,15 @@ TEST_F(CallbackTest, FailingCallbackKeepsReceivingNewSamples) {
 
 TEST_F(CallbackTest, DisableDuringTheSleepEndsTheLoopAtOnce) {
     // Every sample is invalid, so the loop's first poll logs and the loop sleeps a whole period.
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(handle);
     constexpr int32_t kLongPeriodMs = 8000;
-    EnableOk(handle, kLongPeriodMs);
+    EXPECT_EQ(0, Enable(handle, kLongPeriodMs));
     ASSERT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_WARN, "PollInternal, invalid data", kWait));
 
     auto start = steady_clock::now();
-    DisableNow(handle);
+    Disable(handle);
     auto took = steady_clock::now() - start;
     EXPECT_LT(took, milliseconds(kLongPeriodMs / 2))
         << "Disable waited for the notification loop's period";
@@ -145,11 +143,12 @@ TEST_F(CallbackTest, DisableDuringTheSleepEndsTheLoopAtOnce) {
 }
 
 TEST_F(CallbackTest, PeriodBelowOneBecomesOneSecond) {
-    int32_t zero = OpenOk(kRange);
-    int32_t negative = OpenOk(kRange);
+    int32_t zero = Open(kRange);
+    int32_t negative = Open(kRange);
+    for (int32_t handle : {zero, negative}) EXPECT_GT(handle, 0);
     SetCallbackOk(zero);
-    EnableOk(zero, 0);
-    EnableOk(negative, -5);
+    EXPECT_EQ(0, Enable(zero, 0));
+    EXPECT_EQ(0, Enable(negative, -5));
     auto deadline = steady_clock::now() + kWait;
     vyr_test::ModeBlockSnapshot snapshot{};
     do {
@@ -163,4 +162,4 @@ TEST_F(CallbackTest, PeriodBelowOneBecomesOneSecond) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -29,14 +29,13 @@
 #include "service_process.h"
 #include "shared_service_test.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
-using vyr_test::ChildProcess;
 
 constexpr int32_t kRange = 3;
 constexpr milliseconds kWait{10000};
@@ -625,4 +624,4 @@ TEST_F(RealServiceTest, ClientGivesUpClearlyWithoutAService) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

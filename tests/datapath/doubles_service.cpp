@@ -44,6 +44,7 @@
 #include "service_config.h"
 #include "vyrservice.h"
 
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::IVYRService;
@@ -202,8 +203,10 @@ int Stuck(const char* name) {
 }
 
 }  // namespace
+}  // namespace vyr_test::datapath
 
 int main(int argc, char** argv) {
+    using namespace vyr_test::datapath;
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
     if (argc == 3 && strcmp(argv[1], "stuck") == 0) return Stuck(argv[2]);

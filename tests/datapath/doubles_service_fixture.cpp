@@ -15,7 +15,7 @@
 
 #include "test_files.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IVYRService;
@@ -92,4 +92,4 @@ int32_t ServiceAcrossProcessesTest::Poll(int32_t handle) {
     return result;
 }
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

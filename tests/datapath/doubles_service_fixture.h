@@ -18,7 +18,7 @@
 
 #include "child_process.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 
 constexpr int32_t kRangeMode = 3;
 constexpr std::chrono::milliseconds kDeadline{10000};
@@ -68,4 +68,4 @@ class ServiceAcrossProcessesTest : public ::testing::Test {
     std::shared_ptr<aidl::android::vyr::IVYRService> service_;
 };
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

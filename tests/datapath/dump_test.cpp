@@ -4,6 +4,7 @@
 // The service's dump: its content follows the service's state, its JSON form carries the same
 // values as its text, and it never waits long for a busy service.
 
+#include <aidl/android/vyr/Event.h>
 #include <android/log.h>
 
 #include <chrono>
@@ -12,10 +13,10 @@
 #include <string>
 #include <thread>
 
-#include "in_process_service.h"
+#include "data_path_fixture.h"
 #include "service_dump.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using nlohmann::json;
@@ -29,7 +30,7 @@ MultiRangingData Frame(uint32_t time_ms, uint8_t valid = 1) {
     return data;
 }
 
-class DumpTest : public InProcessServiceTest {
+class DumpTest : public DataPathTest {
   protected:
     std::string Text() {
         vyr_test::DumpResult dump = vyr_test::DumpOf(service_->asBinder().get());
@@ -64,15 +65,16 @@ class DumpTest : public InProcessServiceTest {
 };
 
 TEST_F(DumpTest, FollowsOpenEnableAtTwoPeriodsAndDisable) {
-    const int32_t first = OpenOk(kRange);
-    const int32_t second = OpenOk(kRange);
+    const int32_t first = Open(kRange);
+    const int32_t second = Open(kRange);
+    for (int32_t handle : {first, second}) EXPECT_GT(handle, 0);
     json dump = Json();
     EXPECT_EQ(dump["api_lock"], "taken");
     EXPECT_EQ(ClientOf(dump, first)["state"], "disabled");
     EXPECT_TRUE(HasEvent(dump, "open handle " + std::to_string(first) + " mode 3"));
 
-    EnableOk(first, 200);
-    EnableOk(second, 100);
+    EXPECT_EQ(0, Enable(first, 200));
+    EXPECT_EQ(0, Enable(second, 100));
     WaitForRangeItems(2);
     dump = Json();
     const json& block = dump["modes"][kRangeBlock];
@@ -91,7 +93,7 @@ TEST_F(DumpTest, FollowsOpenEnableAtTwoPeriodsAndDisable) {
     EXPECT_EQ(dump["work_queues"][1]["applied"], 2);
     EXPECT_TRUE(HasEvent(dump, "enable handle " + std::to_string(first) + " period 200"));
 
-    DisableNow(second);
+    Disable(second);
     WaitForRangeItems(3);
     dump = Json();
     EXPECT_EQ(dump["modes"][kRangeBlock]["active_period_ms"], 200);
@@ -102,8 +104,9 @@ TEST_F(DumpTest, FollowsOpenEnableAtTwoPeriodsAndDisable) {
 }
 
 TEST_F(DumpTest, TextShowsTheSameValuesAsJson) {
-    const int32_t handle = OpenOk(kRange);
-    EnableOk(handle, 150);
+    const int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
+    EXPECT_EQ(0, Enable(handle, 150));
     WaitForRangeItems(1);
     const json dump = Json();
     const std::string text = Text();
@@ -121,8 +124,9 @@ TEST_F(DumpTest, TextShowsTheSameValuesAsJson) {
 }
 
 TEST_F(DumpTest, CountsSamplesInvalidSamplesRefusedPollsAndDeliveries) {
-    const int32_t poller = OpenOk(kRange);
-    const int32_t pushed = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    const int32_t pushed = Open(kRange);
+    for (int32_t handle : {poller, pushed}) EXPECT_GT(handle, 0);
     auto callback = NewCallback();
     int32_t result = 1;
     ASSERT_TRUE(service_->SetCallback(pushed, callback, &result).isOk());
@@ -132,7 +136,7 @@ TEST_F(DumpTest, CountsSamplesInvalidSamplesRefusedPollsAndDeliveries) {
     EXPECT_EQ(Poll(poller, &event), -61) << "invalid";
     EXPECT_EQ(Poll(poller, &event), -61) << "already taken";
     sensor_doubles::SetRangeData(Frame(2));
-    EnableOk(pushed, 1);
+    EXPECT_EQ(0, Enable(pushed, 1));
     // Valid samples, one at a time, until the callback has had one.
     int published = 1;
     while (published < 50 && callback->Count() == 0) {
@@ -170,7 +174,7 @@ TEST_F(DumpTest, ShowsWhyTheLightSensorIsAbsentAndTheTorchState) {
     EXPECT_EQ(dump["display"]["last_state"], nullptr);
     EXPECT_EQ(dump["apex"], "no listener");
 
-    StartService(false);
+    MakeService(false);
     dump = Json();
     EXPECT_EQ(dump["sensors"]["light"]["state"],
               "absent: persist.vendor.camera.vyr_supported is off");
@@ -178,7 +182,8 @@ TEST_F(DumpTest, ShowsWhyTheLightSensorIsAbsentAndTheTorchState) {
 }
 
 TEST_F(DumpTest, BusyApiLockIsReportedFirstAndTheDumpDoesNotWaitForIt) {
-    const int32_t handle = OpenOk(kRange);
+    const int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     auto callback = NewCallback();
     int32_t result = 1;
     ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
@@ -190,7 +195,7 @@ TEST_F(DumpTest, BusyApiLockIsReportedFirstAndTheDumpDoesNotWaitForIt) {
         if (count == 1) released.wait();
     });
     sensor_doubles::SetRangeData(Frame(1));
-    EnableOk(handle, 1);
+    EXPECT_EQ(0, Enable(handle, 1));
     ASSERT_TRUE(callback->WaitForEvents(1, kWait));
     std::thread disabler([this, handle] { service_->Disable(handle); });
     ASSERT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO,
@@ -212,4 +217,4 @@ TEST_F(DumpTest, BusyApiLockIsReportedFirstAndTheDumpDoesNotWaitForIt) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

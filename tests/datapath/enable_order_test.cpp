@@ -20,7 +20,8 @@
 #include <thread>
 
 #include "client_entry.h"
-#include "in_process_service.h"
+#include "data_path_fixture.h"
+#include "vyrservice_test_peer.h"
 
 namespace {
 
@@ -99,15 +100,16 @@ void operator delete[](void* memory, std::size_t) noexcept {
     std::free(memory);
 }
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
-class EnableOrderTest : public InProcessServiceTest {};
+class EnableOrderTest : public DataPathTest {};
 
 TEST_F(EnableOrderTest, ThreadLetGoByANestedDisableNeverSeesAHalfMadeEnable) {
-    StartService(false);
+    MakeService(false);
     sensor_doubles::SetRangeData(RangeFrame(7));
-    const int32_t handle = OpenOk(kRange);
+    const int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     auto callback = NewCallback();
     int32_t result = 1;
     ASSERT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
@@ -126,14 +128,14 @@ TEST_F(EnableOrderTest, ThreadLetGoByANestedDisableNeverSeesAHalfMadeEnable) {
         rendezvous.changed.notify_all();
         rendezvous.changed.wait_for(lock, kWait, [&] { return rendezvous.go; });
     });
-    EnableOk(handle, 1);
+    EXPECT_EQ(0, Enable(handle, 1));
     {
         std::unique_lock<std::mutex> lock(rendezvous.mutex);
         ASSERT_TRUE(rendezvous.changed.wait_for(lock, kWait, [&] { return rendezvous.disabled; }));
     }
 
     t_allocation_hook = &LetTheOldThreadGoOn;
-    EnableOk(handle, 1);
+    EXPECT_EQ(0, Enable(handle, 1));
     t_allocation_hook = nullptr;
     {
         std::lock_guard<std::mutex> lock(rendezvous.mutex);
@@ -146,4 +148,4 @@ TEST_F(EnableOrderTest, ThreadLetGoByANestedDisableNeverSeesAHalfMadeEnable) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

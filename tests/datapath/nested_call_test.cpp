@@ -4,6 +4,7 @@
 // Calls that a client makes from inside its own OnEvent: they run on the client's notification
 // thread, which must neither join itself nor outlive the entry it reads.
 
+#include <aidl/android/vyr/Event.h>
 #include <android/log.h>
 #include <signal.h>
 
@@ -13,26 +14,28 @@
 #include <thread>
 
 #include "child_process.h"
-#include "in_process_service.h"
+#include "data_path_fixture.h"
 #include "temp_dir.h"
 #include "thread_count.h"
+#include "vyrservice_test_peer.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
 
 constexpr size_t kRangeBlock = 2;
 
-class NestedCallTest : public InProcessServiceTest {
+class NestedCallTest : public DataPathTest {
   protected:
     void SetUp() override {
-        InProcessServiceTest::SetUp();
+        DataPathTest::SetUp();
         // Without the light sensor there is no display monitor whose end could race the count.
-        StartService(false);
+        MakeService(false);
         sensor_doubles::SetRangeData(RangeFrame(7));
         idle_threads_ = vyr_test::ThreadCount();
-        handle_ = OpenOk(kRange);
+        handle_ = Open(kRange);
+        EXPECT_GT(handle_, 0);
         callback_ = NewCallback();
         int32_t result = 1;
         ASSERT_TRUE(service_->SetCallback(handle_, callback_, &result).isOk());
@@ -55,7 +58,7 @@ TEST_F(NestedCallTest, DisableFromOnEventDisablesAndEndsTheThread) {
     callback_->SetReaction([this](size_t count) {
         if (count == 1) service_->Disable(handle_);
     });
-    EnableOk(handle_, 1);
+    EXPECT_EQ(0, Enable(handle_, 1));
     ASSERT_TRUE(callback_->WaitForEvents(1, kWait));
     EXPECT_TRUE(Logged(ANDROID_LOG_INFO, "DisableInternal " + HandleAndMode()));
     WaitForIdleWorkers();
@@ -64,7 +67,7 @@ TEST_F(NestedCallTest, DisableFromOnEventDisablesAndEndsTheThread) {
 
     // The client is disabled, not gone: it can be enabled again and receives events.
     callback_->SetReaction(nullptr);
-    EnableOk(handle_, 1);
+    EXPECT_EQ(0, Enable(handle_, 1));
     EXPECT_TRUE(callback_->WaitForEvents(2, kWait));
 }
 
@@ -74,7 +77,7 @@ TEST_F(NestedCallTest, DisableAndCloseFromOnEventRemoveTheClient) {
         service_->Disable(handle_);
         service_->Close(handle_);
     });
-    EnableOk(handle_, 1);
+    EXPECT_EQ(0, Enable(handle_, 1));
     ASSERT_TRUE(callback_->WaitForEvents(1, kWait));
     EXPECT_TRUE(Logged(ANDROID_LOG_INFO, "DisableInternal " + HandleAndMode()));
     WaitForIdleWorkers();
@@ -82,14 +85,14 @@ TEST_F(NestedCallTest, DisableAndCloseFromOnEventRemoveTheClient) {
     Event event{};
     EXPECT_EQ(Poll(handle_, &event), -22) << "the handle is closed";
     // The table slot is free again: ten more clients fit.
-    for (int i = 0; i < 10; ++i) OpenOk(kRange);
+    for (int i = 0; i < 10; ++i) EXPECT_GT(Open(kRange), 0);
 }
 
 TEST_F(NestedCallTest, CloseFromOnEventKeepsTheEnableCountAsCloseAlwaysDoes) {
     callback_->SetReaction([this](size_t count) {
         if (count == 1) service_->Close(handle_);
     });
-    EnableOk(handle_, 1);
+    EXPECT_EQ(0, Enable(handle_, 1));
     ASSERT_TRUE(callback_->WaitForEvents(1, kWait));
     EXPECT_TRUE(vyr_test::WaitForThreadCount(idle_threads_ + 1, kWait))
         << "the notification thread ends; sampling goes on for the enable left in force";
@@ -112,7 +115,7 @@ TEST_F(NestedCallTest, EnableAfterANestedDisableStartsOneNewThread) {
         service_->Enable(handle_, 1, &result);
         enable_result.set_value(result);
     });
-    EnableOk(handle_, 1);
+    EXPECT_EQ(0, Enable(handle_, 1));
     ASSERT_TRUE(callback_->WaitForEvents(1, kWait));
     sensor_doubles::SetRangeData(RangeFrame(9));
     ASSERT_TRUE(callback_->WaitForEvents(2, kWait)) << "the new notification thread delivers";
@@ -122,7 +125,7 @@ TEST_F(NestedCallTest, EnableAfterANestedDisableStartsOneNewThread) {
     // The old thread has ended; one notification thread and the range worker remain.
     EXPECT_TRUE(vyr_test::WaitForThreadCount(idle_threads_ + 2, kWait))
         << "the processing thread and one notification thread";
-    DisableNow(handle_);
+    Disable(handle_);
     EXPECT_TRUE(NotificationThreadEnded());
 }
 
@@ -150,7 +153,7 @@ class DeathDuringNestedCallTest : public NestedCallTest {
             service_->PollOnce(handle_, &event, &result);
             nested.set_value(result);
         });
-        EnableOk(handle_, 1);
+        EXPECT_EQ(0, Enable(handle_, 1));
         prepare();
         ready.set_value();
         if (nested_result.wait_for(2 * kWait) != std::future_status::ready) {
@@ -203,4 +206,4 @@ TEST_F(DeathDuringNestedCallTest, DeathNoticeReleasesWithoutWaitingForTheClients
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -4,6 +4,7 @@
 // Version 2's delivery on sample: each k-th stored sample pushed at once, batches held for a
 // maximum report latency, Flush, and the end of such a client by Disable or death.
 
+#include <aidl/android/vyr/Event.h>
 #include <android/log.h>
 #include <time.h>
 
@@ -16,12 +17,13 @@
 #include <thread>
 #include <vector>
 
+#include "data_path_fixture.h"
 #include "event_parcel.h"
-#include "in_process_service.h"
 #include "service_dump.h"
 #include "thread_count.h"
+#include "vyrservice_test_peer.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -67,27 +69,20 @@ std::vector<int64_t> Timestamps(const std::vector<Event>& events) {
     return timestamps;
 }
 
-class OnSampleTest : public InProcessServiceTest {
+class OnSampleTest : public DataPathTest {
   protected:
     void SetUp() override {
-        InProcessServiceTest::SetUp();
+        DataPathTest::SetUp();
         // Range clients only: without the light sensor there is no display monitor, whose end
         // could race the tests' counts of threads.
-        StartService(false);
+        MakeService(false);
     }
     void TearDown() override {
         sensor_doubles::Reset();
         for (int32_t handle : on_sample_) service_->Disable(handle);
-        InProcessServiceTest::TearDown();
+        DataPathTest::TearDown();
     }
 
-    std::shared_ptr<RecordingCallback> SetCallbackOk(int32_t handle) {
-        auto callback = NewCallback();
-        int32_t result = 1;
-        EXPECT_TRUE(service_->SetCallback(handle, callback, &result).isOk());
-        EXPECT_EQ(result, 0);
-        return callback;
-    }
     int32_t EnableOnSample(int32_t handle, int32_t period_ms, int32_t latency_ms) {
         int32_t result = 1;
         EXPECT_TRUE(service_->EnableOnSample(handle, period_ms, latency_ms, &result).isOk());
@@ -131,8 +126,9 @@ class OnSampleTest : public InProcessServiceTest {
     // A client enabled on sample at 1 ms that holds every sample, beside a poller whose held
     // sampling lets the test publish each one: its handle.
     int32_t StartHoldingClient(std::shared_ptr<RecordingCallback>* callback) {
-        const int32_t poller = OpenOk(kRange);
-        const int32_t pusher = OpenOk(kRange);
+        const int32_t poller = Open(kRange);
+        const int32_t pusher = Open(kRange);
+        for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
         *callback = SetCallbackOk(pusher);
         sensor_doubles::SetRangeData(RangeFrame(0));
         StartHeldSampling(poller, kRange);
@@ -148,8 +144,9 @@ class OnSampleTest : public InProcessServiceTest {
 };
 
 TEST_F(OnSampleTest, ClientAtThreeTimesTheActivePeriodGetsEveryThirdSample) {
-    const int32_t poller = OpenOk(kRange);
-    const int32_t pusher = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    const int32_t pusher = Open(kRange);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);  // samples at 1 ms
@@ -174,8 +171,9 @@ TEST_F(OnSampleTest, ClientAtThreeTimesTheActivePeriodGetsEveryThirdSample) {
 }
 
 TEST_F(OnSampleTest, ChangeOfTheActivePeriodChangesTheStride) {
-    const int32_t poller = OpenOk(kRange);
-    const int32_t pusher = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    const int32_t pusher = Open(kRange);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
@@ -184,7 +182,7 @@ TEST_F(OnSampleTest, ChangeOfTheActivePeriodChangesTheStride) {
     ASSERT_TRUE(callback->WaitForEvents(1, kWait));
 
     // The 1 ms client leaves: the mode now samples at the pusher's own period, so k becomes 1.
-    DisableNow(poller);
+    Disable(poller);
     ASSERT_TRUE(WaitForActivePeriod(3));
     Publish(4);
     ASSERT_TRUE(callback->WaitForEvents(2, kWait));
@@ -195,7 +193,8 @@ TEST_F(OnSampleTest, ChangeOfTheActivePeriodChangesTheStride) {
 
 TEST_F(OnSampleTest, BatchesHoldTheSamplesOfTheLatencyNoneLostNoneTwice) {
     for (uint32_t t = 1; t <= 300; ++t) sensor_doubles::QueueRangeData(RangeFrame(t));
-    const int32_t pusher = OpenOk(kRange);
+    const int32_t pusher = Open(kRange);
+    EXPECT_GT(pusher, 0);
     auto callback = SetCallbackOk(pusher);
     ASSERT_EQ(EnableOnSample(pusher, 33, 300), 0);
     ASSERT_TRUE(callback->WaitForBatches(3, milliseconds(20000)));
@@ -229,9 +228,10 @@ TEST_F(OnSampleTest, FlushDeliversWhatIsHeldThenCompletes) {
 }
 
 TEST_F(OnSampleTest, FlushWithNothingHeldStillCompletes) {
-    const int32_t poller = OpenOk(kRange);
-    const int32_t batched = OpenOk(kRange);
-    const int32_t direct = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    const int32_t batched = Open(kRange);
+    const int32_t direct = Open(kRange);
+    for (int32_t handle : {poller, batched, direct}) EXPECT_GT(handle, 0);
     auto batched_callback = SetCallbackOk(batched);
     auto direct_callback = SetCallbackOk(direct);
     sensor_doubles::SetRangeData(RangeFrame(0));
@@ -250,8 +250,9 @@ TEST_F(OnSampleTest, FlushWithNothingHeldStillCompletes) {
 }
 
 TEST_F(OnSampleTest, RefusedRequestsSayWhy) {
-    const int32_t polling = OpenOk(kRange);
-    const int32_t timed = OpenOk(kRange);
+    const int32_t polling = Open(kRange);
+    const int32_t timed = Open(kRange);
+    for (int32_t handle : {polling, timed}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(timed);
     constexpr int32_t kUnknown = 12345;
 
@@ -264,15 +265,16 @@ TEST_F(OnSampleTest, RefusedRequestsSayWhy) {
     EXPECT_EQ(EnableOnSample(timed, 10, kNeverDue + 1), -22) << "past the longest latency";
 
     // Enabled the version 1 way: a timer loop, nothing held, nothing to flush.
-    EnableOk(timed, 10);
+    EXPECT_EQ(0, Enable(timed, 10));
     EXPECT_EQ(Flush(timed), -22);
     EXPECT_EQ(EnableOnSample(timed, 10, 0), -17);
     EXPECT_EQ(callback->Flushes().size(), 0u);
 }
 
 TEST_F(OnSampleTest, DisableEndsTheDeliveryThread) {
-    const int32_t poller = OpenOk(kRange);
-    const int32_t pusher = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    const int32_t pusher = Open(kRange);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
@@ -291,8 +293,9 @@ TEST_F(OnSampleTest, DisableEndsTheDeliveryThread) {
 }
 
 TEST_F(OnSampleTest, DeathOfTheClientEndsItsDelivery) {
-    const int32_t poller = OpenOk(kRange);
-    const int32_t pusher = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    const int32_t pusher = Open(kRange);
+    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
@@ -308,7 +311,8 @@ TEST_F(OnSampleTest, DeathOfTheClientEndsItsDelivery) {
 }
 
 TEST_F(OnSampleTest, PolledEventCarriesTheBootTimeOfItsRead) {
-    const int32_t poller = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    EXPECT_GT(poller, 0);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange);
     Event event{};
@@ -325,7 +329,8 @@ TEST_F(OnSampleTest, PolledEventCarriesTheBootTimeOfItsRead) {
 // the samples stored meanwhile wait in its queue.
 TEST_F(OnSampleTest, ASlowBatchReceiverGetsEverySampleInOrder) {
     QueueNumberedFrames(1, 3000, 1);
-    const int32_t pusher = OpenOk(kRange);
+    const int32_t pusher = Open(kRange);
+    EXPECT_GT(pusher, 0);
     auto callback = SetCallbackOk(pusher);
     callback->SetBatchReaction([] { std::this_thread::sleep_for(milliseconds(30)); });
     ASSERT_EQ(EnableOnSample(pusher, 10, 100), 0);
@@ -342,8 +347,9 @@ TEST_F(OnSampleTest, ASlowBatchReceiverGetsEverySampleInOrder) {
 // it loses its oldest samples beyond its queue, counted in the dump and warned of once.
 TEST_F(OnSampleTest, AClientBlockedInOnEventLosesOnlyItsOwnOldestSamples) {
     QueueNumberedFrames(1, 5000, 1);
-    const int32_t stuck = OpenOk(kRange);
-    const int32_t other = OpenOk(kRange);
+    const int32_t stuck = Open(kRange);
+    const int32_t other = Open(kRange);
+    for (int32_t handle : {stuck, other}) EXPECT_GT(handle, 0);
     auto stuck_callback = SetCallbackOk(stuck);
     auto other_callback = SetCallbackOk(other);
     std::atomic<size_t> other_during{0};
@@ -390,7 +396,8 @@ TEST_F(OnSampleTest, AClientBlockedInOnEventLosesOnlyItsOwnOldestSamples) {
 // none larger, and nothing is lost.
 TEST_F(OnSampleTest, FourZonesAtTheLongestLatencyComeInBatchesUnderTheBudget) {
     QueueNumberedFrames(1, 6000, 4);
-    const int32_t pusher = OpenOk(kRange);
+    const int32_t pusher = Open(kRange);
+    EXPECT_GT(pusher, 0);
     auto callback = SetCallbackOk(pusher);
     ASSERT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
     ASSERT_TRUE(callback->WaitForBatches(3, 3 * kWait));
@@ -454,9 +461,10 @@ TEST_F(OnSampleTest, AFlushIsCompletedWhenCloseFollowsAtOnce) {
 // When the active period shrinks from 100 ms to 10 ms, the next sample of a 100 ms client is the
 // first one 100 ms after its last, not the tenth one after the change.
 TEST_F(OnSampleTest, TheStrideFollowsTimeWhenTheActivePeriodShrinks) {
-    const int32_t poller = OpenOk(kRange);
-    const int32_t pusher = OpenOk(kRange);
-    const int32_t fast = OpenOk(kRange);
+    const int32_t poller = Open(kRange);
+    const int32_t pusher = Open(kRange);
+    const int32_t fast = Open(kRange);
+    for (int32_t handle : {poller, pusher, fast}) EXPECT_GT(handle, 0);
     auto callback = SetCallbackOk(pusher);
     sensor_doubles::SetRangeData(RangeFrame(0));
     StartHeldSampling(poller, kRange, 100);
@@ -464,7 +472,7 @@ TEST_F(OnSampleTest, TheStrideFollowsTimeWhenTheActivePeriodShrinks) {
     Publish(1);
     ASSERT_TRUE(callback->WaitForEvents(1, kWait));
     const auto first_stored = std::chrono::steady_clock::now();
-    EnableOk(fast, 10);
+    EXPECT_EQ(0, Enable(fast, 10));
     ASSERT_TRUE(WaitForActivePeriod(10));
     // A whole client period after the first sample; the mode has sampled once since, at 10 ms.
     std::this_thread::sleep_until(first_stored + milliseconds(100));
@@ -476,4 +484,4 @@ TEST_F(OnSampleTest, TheStrideFollowsTimeWhenTheActivePeriodShrinks) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -4,20 +4,21 @@
 // ConfigureParameters and SetTorchLightState, and the result code of every method for a handle
 // that the service does not know.
 
+#include <aidl/android/vyr/Event.h>
 #include <android/log.h>
 
 #include <climits>
 #include <vector>
 
-#include "in_process_service.h"
+#include "data_path_fixture.h"
 #include "recording_callback.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
 
-class ParametersTest : public InProcessServiceTest {
+class ParametersTest : public DataPathTest {
   protected:
     int32_t Configure(int32_t handle, const std::vector<int32_t>& values) {
         int32_t result = 1;
@@ -27,7 +28,8 @@ class ParametersTest : public InProcessServiceTest {
 };
 
 TEST_F(ParametersTest, ElevenValuesReachTheRangeSensorInOrder) {
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     ASSERT_EQ(Configure(handle, {11, -22, INT_MAX, INT_MIN, 1, 1, 1, 7, -8, 9, 10}), 0);
 
     auto calls = sensor_doubles::CallsNamed(sensor_doubles::kRangeConfigureParameters);
@@ -48,7 +50,8 @@ TEST_F(ParametersTest, ElevenValuesReachTheRangeSensorInOrder) {
 }
 
 TEST_F(ParametersTest, FlagsAreSetOnlyByExactlyOne) {
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     ASSERT_EQ(Configure(handle, {0, 0, 0, 0, 2, -1, 0, 0, 0, 0, 0}), 0);
     ASSERT_EQ(Configure(handle, {0, 0, 0, 0, 257, 1, 3, 0, 0, 0, 0}), 0);
 
@@ -63,7 +66,8 @@ TEST_F(ParametersTest, FlagsAreSetOnlyByExactlyOne) {
 }
 
 TEST_F(ParametersTest, WrongValueCountIsRefusedWithItsSize) {
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     EXPECT_EQ(Configure(handle, std::vector<int32_t>(10, 1)), -22);
     EXPECT_EQ(Configure(handle, std::vector<int32_t>(12, 1)), -22);
     EXPECT_EQ(Configure(handle, {}), -22);
@@ -80,7 +84,8 @@ TEST_F(ParametersTest, WrongValueCountIsRefusedWithItsSize) {
 }
 
 TEST_F(ParametersTest, LightClientCannotConfigure) {
-    int32_t handle = OpenOk(kAls);
+    int32_t handle = Open(kAls);
+    EXPECT_GT(handle, 0);
     EXPECT_EQ(Configure(handle, std::vector<int32_t>(11, 0)), -22);
     EXPECT_EQ(Configure(handle, std::vector<int32_t>(3, 0)), -22);
     EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_ERROR, "ConfigureParameters, mode 1 is not supported"),
@@ -106,7 +111,7 @@ TEST_F(ParametersTest, TorchStateIsNarrowedToItsLowByte) {
 }
 
 TEST_F(ParametersTest, TorchWithoutLightSensorDoesNothing) {
-    StartService(false);
+    MakeService(false);
     log_.Clear();
     EXPECT_TRUE(service_->SetTorchLightState(1).isOk());
     EXPECT_EQ(sensor_doubles::CountOf(sensor_doubles::kAlsSetTorchLightState), 0u);
@@ -142,8 +147,9 @@ TEST_F(ParametersTest, UnknownHandleResultPerMethod) {
 }
 
 TEST_F(ParametersTest, LowPowerIsRefusedForRangeClients) {
-    int32_t range = OpenOk(kRange);
-    int32_t light = OpenOk(kAls);
+    int32_t range = Open(kRange);
+    int32_t light = Open(kAls);
+    for (int32_t handle : {range, light}) EXPECT_GT(handle, 0);
     int32_t result = 0;
     EXPECT_TRUE(service_->EnableLowPower(range, true, &result).isOk());
     EXPECT_EQ(result, -22);
@@ -152,4 +158,4 @@ TEST_F(ParametersTest, LowPowerIsRefusedForRangeClients) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

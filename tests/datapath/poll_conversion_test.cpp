@@ -3,14 +3,15 @@
 
 // PollOnce: the Event made from each sensor record, and each sample taken once per handle.
 
+#include <aidl/android/vyr/Event.h>
 #include <android/log.h>
 
 #include <cstdint>
 #include <vector>
 
-#include "in_process_service.h"
+#include "data_path_fixture.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -116,12 +117,13 @@ void ExpectSentinel(const Event& event) {
     EXPECT_EQ(event.data, std::vector<float>{42.0f});
 }
 
-class PollTest : public InProcessServiceTest {};
+class PollTest : public DataPathTest {};
 
 TEST_F(PollTest, RangeEventWithTwoZonesHoldsEveryFieldAsConverted) {
     MultiRangingData frame = ExtremeFrame(2);
     sensor_doubles::SetRangeData(frame);
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     StartHeldSampling(handle, kRange);
 
     Event event = Sentinel();
@@ -142,7 +144,8 @@ TEST_F(PollTest, RangeEventWithTwoZonesHoldsEveryFieldAsConverted) {
 TEST_F(PollTest, RangeEventWithNoZonesHoldsTheHeaderOnly) {
     MultiRangingData frame = ExtremeFrame(0);
     sensor_doubles::SetRangeData(frame);
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     StartHeldSampling(handle, kRange);
 
     Event event{};
@@ -153,7 +156,8 @@ TEST_F(PollTest, RangeEventWithNoZonesHoldsTheHeaderOnly) {
 
 TEST_F(PollTest, AlsEventSwapsTheLastTwoChannels) {
     sensor_doubles::SetAlsData(AlsSample());
-    int32_t handle = OpenOk(kAls);
+    int32_t handle = Open(kAls);
+    EXPECT_GT(handle, 0);
     StartHeldSampling(handle, kAls);
 
     Event event = Sentinel();
@@ -167,8 +171,9 @@ TEST_F(PollTest, AlsEventSwapsTheLastTwoChannels) {
 
 TEST_F(PollTest, EachHandleTakesASampleOnce) {
     sensor_doubles::SetRangeData(ExtremeFrame(1));
-    int32_t sampler = OpenOk(kRange);
-    int32_t other = OpenOk(kRange);
+    int32_t sampler = Open(kRange);
+    int32_t other = Open(kRange);
+    for (int32_t handle : {sampler, other}) EXPECT_GT(handle, 0);
     StartHeldSampling(sampler, kRange);
 
     Event first{};
@@ -200,7 +205,8 @@ TEST_F(PollTest, EachHandleTakesASampleOnce) {
 }
 
 TEST_F(PollTest, NoSampleYetIsInvalidDataLoggedOnce) {
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     Event event = Sentinel();
     EXPECT_EQ(Poll(handle, &event), -61);
     ExpectSentinel(event);
@@ -215,7 +221,8 @@ TEST_F(PollTest, InvalidSampleIsLoggedOnceAndLeavesTheEventAlone) {
     MultiRangingData frame = ExtremeFrame(2);
     frame.valid = 0;
     sensor_doubles::SetRangeData(frame);
-    int32_t handle = OpenOk(kRange);
+    int32_t handle = Open(kRange);
+    EXPECT_GT(handle, 0);
     StartHeldSampling(handle, kRange);
     log_.Clear();
 
@@ -231,8 +238,9 @@ TEST_F(PollTest, InvalidSampleIsLoggedOnceAndLeavesTheEventAlone) {
     ALSResult als = AlsSample();
     als.valid = 0;
     sensor_doubles::SetAlsData(als);
-    int32_t light = OpenOk(kAls);
-    EnableOk(light, 1);
+    int32_t light = Open(kAls);
+    EXPECT_GT(light, 0);
+    EXPECT_EQ(0, Enable(light, 1));
     ASSERT_TRUE(sensor_doubles::WaitForCalls(sensor_doubles::kAlsReadSingleShot, 2, kWait));
     // Every stored sample is invalid, so no poll ever succeeds.
     EXPECT_EQ(Poll(light, &event), -61);
@@ -251,15 +259,16 @@ TEST_F(PollTest, UnknownHandleIsInvalidArgument) {
 
 TEST_F(PollTest, StoredSampleOutlivesSampling) {
     sensor_doubles::SetRangeData(ExtremeFrame(2));
-    int32_t sampler = OpenOk(kRange);
-    int32_t late = OpenOk(kRange);
+    int32_t sampler = Open(kRange);
+    int32_t late = Open(kRange);
+    for (int32_t handle : {sampler, late}) EXPECT_GT(handle, 0);
     StartHeldSampling(sampler, kRange);
     Event event{};
     ASSERT_EQ(Poll(sampler, &event), 0);
 
     // Stop sampling while the next read is held; the read that returns after the stop is dropped.
     size_t enables = sensor_doubles::CountOf(sensor_doubles::kRangeEnable);
-    DisableNow(sampler);
+    Disable(sampler);
     ASSERT_TRUE(sensor_doubles::WaitForCalls(sensor_doubles::kRangeEnable, enables + 1, kWait));
     sensor_doubles::SetRangeData(MultiRangingData{});
     sensor_doubles::Release(sensor_doubles::kRangeProcess);
@@ -273,4 +282,4 @@ TEST_F(PollTest, StoredSampleOutlivesSampling) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -19,13 +19,11 @@
 #include "child_process.h"
 #include "service_process.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using nlohmann::json;
 using std::chrono::milliseconds;
-using vyr_test::ChildProcess;
-using vyr_test::ServiceProcess;
 
 // The service waits 4 s before it registers; sanitizer builds start slower still.
 constexpr milliseconds kRegistration{30000};
@@ -144,4 +142,4 @@ TEST_F(ReplayRoundTripTest, ABadRecordingLeavesTheSensorAbsentAndTheServiceServi
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

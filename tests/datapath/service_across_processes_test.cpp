@@ -33,14 +33,12 @@
 #include "doubles_service_fixture.h"
 #include "recording_callback.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
-using vyr_test::ChildProcess;
-using vyr_test::RecordingCallback;
 
 // What the client library told the application.
 class Listener : public vyr::SensorClientListener {
@@ -389,4 +387,4 @@ TEST_F(ServiceAcrossProcessesTest, AnOnSampleCallbackThatNeverAnswersHoldsOnlyIt
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -15,7 +15,7 @@
 
 #include "service_process.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 
 class SharedServiceTest : public ::testing::Test {
   protected:
@@ -47,4 +47,4 @@ class SharedServiceTest : public ::testing::Test {
     static inline std::shared_ptr<aidl::android::vyr::IVYRService> service_;
 };
 
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

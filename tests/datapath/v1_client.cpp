@@ -25,6 +25,7 @@
 #include <thread>
 #include <vector>
 
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::BnEventCallback;
@@ -142,8 +143,10 @@ int CallbackClient(IVYRService& service) {
 }
 
 }  // namespace
+}  // namespace vyr_test::datapath
 
 int main(int argc, char** argv) {
+    using namespace vyr_test::datapath;
     const std::string mode = argc > 1 ? argv[1] : "";
     ABinderProcess_startThreadPool();
     std::shared_ptr<IVYRService> service;

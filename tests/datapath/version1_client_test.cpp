@@ -19,12 +19,11 @@
 #include "service_process.h"
 #include "shared_service_test.h"
 
-namespace vyr_datapath {
+namespace vyr_test::datapath {
 namespace {
 
 using aidl::android::vyr::IVYRService;
 using std::chrono::milliseconds;
-using vyr_test::ChildProcess;
 
 constexpr milliseconds kWait{10000};
 
@@ -101,4 +100,4 @@ TEST_F(Version1ClientTest, CallbackEnabledOnSampleGetsOnlyOnEvent) {
 }
 
 }  // namespace
-}  // namespace vyr_datapath
+}  // namespace vyr_test::datapath

@@ -16,6 +16,7 @@
 #include "temp_dir.h"
 #include "test_files.h"
 
+namespace vyr_test::device {
 namespace {
 
 namespace fs = std::filesystem;
@@ -470,3 +471,4 @@ TEST_F(DeviceFilesTest, AMissingDependencyFailsInSoong) {
 }
 
 }  // namespace
+}  // namespace vyr_test::device

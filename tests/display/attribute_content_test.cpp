@@ -1,11 +1,13 @@
 // Copyright (C) 2026 The vyrservice Authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include <android/log.h>
+
 #include <cerrno>
 
 #include "display_fixture.h"
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 namespace {
 
 using AttributeContentTest = DisplayTest;
@@ -98,4 +100,4 @@ TEST_F(AttributeContentTest, ContentIsJudgedAsReadWithoutANewline) {
 }
 
 }  // namespace
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

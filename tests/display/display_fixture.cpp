@@ -3,6 +3,7 @@
 
 #include "display_fixture.h"
 
+#include <android/log.h>
 #include <dirent.h>
 #include <limits.h>
 #include <unistd.h>
@@ -12,9 +13,11 @@
 #include <future>
 #include <thread>
 
+#include "sensor_doubles.h"
 #include "uts_namespace.h"
+#include "work_log.h"
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 namespace {
 
 bool UnderCi() {
@@ -54,10 +57,10 @@ void DisplayTest::SetUp() {
         if (UnderCi()) GTEST_FAIL() << UtsNamespaceProblem();
         GTEST_SKIP() << UtsNamespaceProblem();
     }
-    sensor_doubles::Reset();
+    ServiceFixture::SetUp();
+    // Built with the panel dark, the service starts with the light sensor off.
+    display_path_ = kStatePath;
     Panel("Off");
-    baseline_threads_ = vyr_test::SettledThreadCount();
-    baseline_names_ = vyr_test::ThreadNames();
 }
 
 void DisplayTest::TearDown() {
@@ -78,9 +81,7 @@ void DisplayTest::TearDown() {
     EXPECT_TRUE(DestroyService());
     fuse_.reset();
     sensor_doubles::Reset();
-    EXPECT_TRUE(WaitForThreadCount(baseline_threads_, 5s))
-        << "threads left: " << ThreadCount() << " (" << vyr_test::ThreadNames() << "), expected "
-        << baseline_threads_ << " (" << baseline_names_ << ")";
+    ServiceFixture::TearDown();
 }
 
 void DisplayTest::MakeServiceOnFuse() {
@@ -95,12 +96,8 @@ void DisplayTest::MakeServiceOnFuse() {
         if (UnderCi()) GTEST_FAIL() << problem;
         GTEST_SKIP() << problem;
     }
-    MakeService(true, true, fuse_->path());
-}
-
-void DisplayTest::MakeService(bool als, bool range, const std::string& path) {
-    service_ = ndk::SharedRefBase::make<VYRService>(
-        Config({{vyr_test::kAlsProperty, als}, {vyr_test::kRangeProperty, range}}, path));
+    display_path_ = fuse_->path();
+    MakeService();
 }
 
 bool DisplayTest::DestroyService() {
@@ -201,4 +198,4 @@ int32_t DisplayTest::DisplayHandle() {
     return block.periods.empty() ? 0 : block.periods.begin()->first;
 }
 
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

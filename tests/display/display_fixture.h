@@ -3,8 +3,6 @@
 
 #pragma once
 
-#include <aidl/android/vyr/IVYRService.h>
-#include <android/log.h>
 #include <gtest/gtest.h>
 
 #include <chrono>
@@ -15,49 +13,34 @@
 #include <string>
 
 #include "fuse_attribute.h"
-#include "log_capture.h"
-#include "sensor_doubles.h"
 #include "service_fixture.h"
-#include "thread_count.h"
-#include "vyrservice.h"
 #include "vyrservice_test_peer.h"
-#include "work_log.h"
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 
-using android::vyr::binder::ServiceConfig;
-using android::vyr::binder::VYRService;
 using namespace std::chrono_literals;
 
-using vyr_test::kTag;
-using vyr_test::kWait;
 // The kernel's hostname attribute: poll() reports POLLPRI|POLLERR on every sethostname(), and a
 // read returns this namespace's hostname and a newline.
 inline constexpr char kStatePath[] = "/proc/sys/kernel/hostname";
 inline constexpr int32_t kAlsBlock = 0;
 inline constexpr int32_t kRangeBlock = 2;
 
-using vyr_test::Hex;
-using vyr_test::ThreadCount;
-using vyr_test::WaitForThreadCount;
-
-// Builds the service on the sensor doubles with the display monitor watching the hostname
-// attribute, and drives the "panel" through sethostname(). Needs a UTS namespace of its own
-// (root); skips without one, and fails under CI=true.
+// The service's display monitor watches the hostname attribute, and the test drives the "panel"
+// through sethostname(). Needs a UTS namespace of its own (root); skips without one, and fails
+// under CI=true.
 class DisplayTest : public vyr_test::ServiceFixture {
   protected:
     void SetUp() override;
     void TearDown() override;
 
-    // Both properties as given; the service is built with the panel dark ("Off").
-    void MakeService(bool als = true, bool range = true, const std::string& path = kStatePath);
     // Builds the service with both sensors, watching a FUSE attribute (fuse_) whose content and
     // read errors the test chooses. Skips (fails under CI=true) where FUSE is unavailable; fuse_
     // stays null then, and the test must return.
     void MakeServiceOnFuse();
     // Destroys the service on another thread, waking the display monitor (which blocks in poll()
     // without a time-out) until the destruction has finished. False if it did not within kWait.
-    bool DestroyService();
+    bool DestroyService() override;
 
     // Sets the attribute's content; the monitor reads it with a trailing newline.
     void Panel(const std::string& state);
@@ -89,11 +72,8 @@ class DisplayTest : public vyr_test::ServiceFixture {
     // The only handle with a period in the light block: the display's, while no client enabled.
     int32_t DisplayHandle();
 
-    std::shared_ptr<VYRService> service_;
-    size_t baseline_threads_ = 0;
-    std::string baseline_names_;
     std::string panel_ = "Off";
     std::unique_ptr<FuseAttribute> fuse_;
 };
 
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

@@ -1,12 +1,15 @@
 // Copyright (C) 2026 The vyrservice Authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include <android/log.h>
 #include <unistd.h>
 
 #include "display_fixture.h"
+#include "sensor_doubles.h"
 #include "service_dump.h"
+#include "thread_count.h"
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 namespace {
 
 using sensor_doubles::CallsNamed;
@@ -230,4 +233,4 @@ TEST_F(DisplayStateTest, NoMonitorWithoutTheLightProperty) {
 }
 
 }  // namespace
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

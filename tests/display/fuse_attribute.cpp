@@ -16,7 +16,7 @@
 #include <cstring>
 #include <vector>
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 namespace {
 
 constexpr uint64_t kFileNode = 2;
@@ -253,4 +253,4 @@ void FuseAttribute::Reply(uint64_t unique, int error, const void* payload, size_
     (void)!writev(fuse_fd_, parts, size > 0 ? 2 : 1);
 }
 
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

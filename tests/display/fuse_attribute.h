@@ -14,7 +14,7 @@
 #include <string>
 #include <thread>
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 
 // A one-file FUSE file system served by a thread of this process: its file behaves like a sysfs
 // attribute (poll() reports POLLPRI|POLLERR once after each change) but holds any content the
@@ -69,4 +69,4 @@ class FuseAttribute {
     size_t reads_ = 0;
 };
 
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

@@ -2,14 +2,17 @@
 // SPDX-License-Identifier: Apache-2.0
 
 #include <aidl/android/vyr/BnEventCallback.h>
+#include <android/log.h>
 
 #include <condition_variable>
 #include <mutex>
 #include <vector>
 
 #include "display_fixture.h"
+#include "sensor_doubles.h"
+#include "thread_count.h"
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -190,4 +193,4 @@ TEST_F(ShutdownTest, OpenClientsHaveTheirNotificationThreadsJoined) {
 }
 
 }  // namespace
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

@@ -5,7 +5,7 @@
 
 #include <string>
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 
 // Set by main() before any thread exists: whether this process has a UTS namespace of its own,
 // and if not, why.
@@ -14,4 +14,4 @@ const std::string& UtsNamespaceProblem();
 // Whether mounts made by this process are its own (a private mount namespace).
 bool HavePrivateMounts();
 
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display

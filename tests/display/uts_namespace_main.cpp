@@ -16,7 +16,7 @@
 
 #include "uts_namespace.h"
 
-namespace vyr_display_test {
+namespace vyr_test::display {
 namespace {
 
 bool g_have_namespace = false;
@@ -37,16 +37,16 @@ bool HavePrivateMounts() {
     return g_private_mounts;
 }
 
-}  // namespace vyr_display_test
+}  // namespace vyr_test::display
 
 int main(int argc, char** argv) {
     if (unshare(CLONE_NEWUTS | CLONE_NEWNS) == 0) {
-        vyr_display_test::g_have_namespace = true;
+        vyr_test::display::g_have_namespace = true;
         // File systems that tests mount stay invisible to the machine and die with the process.
-        vyr_display_test::g_private_mounts =
+        vyr_test::display::g_private_mounts =
             mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
     } else {
-        vyr_display_test::g_problem =
+        vyr_test::display::g_problem =
             std::string("cannot create UTS and mount namespaces (needs root / CAP_SYS_ADMIN): ") +
             strerror(errno);
     }

@@ -15,7 +15,7 @@
 #include "shell_client.h"
 #include "test_files.h"
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 namespace {
 
 using namespace std::chrono_literals;
@@ -272,4 +272,4 @@ TEST_F(E2eTest, RangePropertyOffRefusesTheRangeMode) {
 }
 
 }  // namespace
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

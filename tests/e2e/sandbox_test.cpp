@@ -19,15 +19,13 @@
 #include "child_process.h"
 #include "test_files.h"
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 namespace {
 
 using namespace std::chrono_literals;
 
 constexpr auto kWait = 10s;
 constexpr char kSetpriv[] = "/usr/bin/setpriv";
-
-using vyr_test::ReadFile;
 
 // vyr-sandbox running a shell command, with its stderr (and the command's output) in a file.
 class SandboxTest : public ::testing::Test {
@@ -174,4 +172,4 @@ TEST_F(SandboxTest, ExitsWith77WithoutPrivilege) {
 }
 
 }  // namespace
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

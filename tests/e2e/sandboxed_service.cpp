@@ -18,7 +18,7 @@
 
 #include "test_files.h"
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 namespace {
 
 using namespace std::chrono_literals;
@@ -172,14 +172,7 @@ bool SandboxedService::WaitForLog(const std::string& tag, char priority, const s
 }
 
 std::map<std::string, std::string> SandboxedService::SensorState() const {
-    std::map<std::string, std::string> state;
-    std::ifstream in(dir_ + "/sensors");
-    std::string line;
-    while (std::getline(in, line)) {
-        const size_t equals = line.find('=');
-        if (equals != std::string::npos) state[line.substr(0, equals)] = line.substr(equals + 1);
-    }
-    return state;
+    return vyr_test::ReadKeyValues(dir_ + "/sensors");
 }
 
 bool SandboxedService::WaitForSensorState(const std::string& key, const std::string& value,
@@ -203,4 +196,4 @@ std::optional<pid_t> SandboxedService::WaitForRestart(std::chrono::milliseconds 
     return service_pid_;
 }
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

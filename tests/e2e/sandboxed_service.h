@@ -15,7 +15,7 @@
 #include "child_process.h"
 #include "service_log.h"
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 
 // The real vyrservice binary in vyr-sandbox, in a fresh temporary directory of its own that holds
 // the binder registry, the property file, the APEX info list, the simulator's state file and
@@ -72,4 +72,4 @@ class SandboxedService {
     std::optional<int> exit_status_;
 };
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

@@ -3,9 +3,9 @@
 
 #include "service_log.h"
 
-#include <fstream>
+#include "test_files.h"
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 
 namespace {
 
@@ -41,9 +41,7 @@ bool ParseHeader(const std::string& line, LogLine* record) {
 
 std::vector<LogLine> ReadServiceLog(const std::string& path) {
     std::vector<LogLine> records;
-    std::ifstream in(path);
-    std::string line;
-    while (std::getline(in, line)) {
+    for (const std::string& line : vyr_test::SplitLines(vyr_test::ReadFile(path))) {
         LogLine record;
         if (ParseHeader(line, &record)) {
             records.push_back(record);
@@ -75,4 +73,4 @@ size_t CountRecords(const std::vector<LogLine>& records, const std::string& tag,
     return count;
 }
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

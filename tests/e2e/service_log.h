@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 
 // One record of the host liblog output on stderr:
 // "<tag> <priority letter> <date> <time> <pid> <tid> <message>", where a message that contains
@@ -25,4 +25,4 @@ int FindRecord(const std::vector<LogLine>& records, const std::string& tag, char
 size_t CountRecords(const std::vector<LogLine>& records, const std::string& tag, char priority,
                     const std::string& message);
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

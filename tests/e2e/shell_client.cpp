@@ -5,7 +5,7 @@
 
 #include <thread>
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 namespace {
 
 using namespace std::chrono_literals;
@@ -50,4 +50,4 @@ bool ShellClient::CallUntil(const std::string& command, int64_t expected,
     return true;
 }
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

@@ -12,7 +12,7 @@
 
 #include "child_process.h"
 
-namespace vyr_e2e {
+namespace vyr_test::e2e {
 
 // A `vyrctl shell` client process: one command line in, one "<command> -> <result>" line out.
 class ShellClient {
@@ -29,4 +29,4 @@ class ShellClient {
     std::unique_ptr<vyr_test::ChildProcess> process_;
 };
 
-}  // namespace vyr_e2e
+}  // namespace vyr_test::e2e

@@ -11,6 +11,7 @@
 
 #include "test_files.h"
 
+namespace vyr_test::properties {
 namespace {
 
 constexpr char kKey[] = "persist.vendor.camera.vyr_supported";
@@ -171,3 +172,4 @@ TEST_F(HostPropertiesTest, IntegersParseLikeThePlatform) {
 }
 
 }  // namespace
+}  // namespace vyr_test::properties

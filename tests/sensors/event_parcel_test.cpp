@@ -11,6 +11,7 @@
 #include <limits>
 #include <vector>
 
+namespace vyr_test::sensors {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -115,3 +116,4 @@ TEST(EventParcelTest, ReadingPastTheEndFails) {
 }
 
 }  // namespace
+}  // namespace vyr_test::sensors

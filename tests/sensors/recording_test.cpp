@@ -18,6 +18,7 @@
 #include "options.h"
 #include "temp_dir.h"
 
+namespace vyr_test::sensors {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -203,3 +204,4 @@ TEST_F(RecordingTest, BadFilesAreRefusedWithTheFileAndLine) {
 }
 
 }  // namespace
+}  // namespace vyr_test::sensors

@@ -9,6 +9,7 @@
 #include "log_capture.h"
 #include "temp_dir.h"
 
+namespace vyr_test::sensors {
 namespace {
 
 using sensors_sim::LoadScenario;
@@ -107,3 +108,4 @@ TEST(ScenarioTest, MissingFileGivesDefaultsAndAWarning) {
 }
 
 }  // namespace
+}  // namespace vyr_test::sensors

@@ -9,6 +9,7 @@
 #include <cmath>
 #include <cstring>
 
+namespace vyr_test::sensors {
 namespace {
 
 using sensors_sim::SceneModel;
@@ -146,3 +147,4 @@ TEST(SceneModelTest, LightDriftsSlowly) {
 }
 
 }  // namespace
+}  // namespace vyr_test::sensors

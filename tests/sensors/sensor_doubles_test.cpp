@@ -13,6 +13,7 @@
 namespace sd = sensor_doubles;
 using namespace std::chrono_literals;
 
+namespace vyr_test::sensors {
 namespace {
 
 class SensorDoublesTest : public ::testing::Test {
@@ -374,3 +375,4 @@ TEST_F(SensorDoublesTest, ConcurrentCallsAreAllRecorded) {
 }
 
 }  // namespace
+}  // namespace vyr_test::sensors

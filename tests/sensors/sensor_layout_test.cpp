@@ -11,6 +11,7 @@
 #include "ambient_light_sensor.h"
 #include "ubk/range_sensor.h"
 
+namespace vyr_test::sensors {
 namespace {
 
 static_assert(std::is_trivially_copyable_v<ALSResult>);
@@ -27,3 +28,4 @@ TEST(SensorLayoutTest, RecordSizes) {
 }
 
 }  // namespace
+}  // namespace vyr_test::sensors

@@ -19,6 +19,7 @@
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
 
+namespace vyr_test::sensors {
 namespace {
 
 // Each test gets its own scenario file and state file; both sensors are destroyed after it.
@@ -519,3 +520,4 @@ TEST_F(SensorSimulatorTest, ALightReplayLoopsAndStopsWhenTheSensorGoesOff) {
 }
 
 }  // namespace
+}  // namespace vyr_test::sensors

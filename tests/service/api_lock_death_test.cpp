@@ -3,10 +3,16 @@
 
 #include <thread>
 
-#include "service_test_fixture.h"
+#include "sensor_doubles.h"
+#include "service_fixture.h"
 
-namespace vyr_service_test {
+namespace vyr_test::service {
 namespace {
+
+using namespace std::chrono_literals;
+using aidl::android::vyr::IVYRService;
+using android::vyr::binder::ServiceConfig;
+using android::vyr::binder::VYRService;
 
 // Holds the API lock by parking SetTorchLightState inside the sensor library, then makes a
 // second call, which must give up after 10 s and end the process.
@@ -37,4 +43,4 @@ TEST(ApiLockDeathTest, CallThatCannotTakeTheLockWithinTenSecondsAborts) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

@@ -25,13 +25,12 @@
 #include "temp_dir.h"
 #include "thread_count.h"
 
-namespace vyr_service_test {
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::ClientProcessWatcher;
 using ProcessId = ClientProcessWatcher::ProcessId;
 using std::chrono::milliseconds;
-using vyr_test::ChildProcess;
 
 constexpr milliseconds kWait{5000};
 constexpr char kTag[] = "vyrservice";
@@ -301,4 +300,4 @@ TEST_F(ClientProcessWatcherTest, DestructionDuringPollFailuresLeavesNoThread) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

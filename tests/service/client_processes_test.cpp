@@ -18,7 +18,7 @@
 #include "child_process.h"
 #include "temp_dir.h"
 
-namespace vyr_test {
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::ClientEntry;
@@ -145,4 +145,4 @@ TEST_F(ClientProcessesTest, NoEndIsReportedAfterStop) {
 }
 
 }  // namespace
-}  // namespace vyr_test
+}  // namespace vyr_test::service

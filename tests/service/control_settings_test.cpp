@@ -7,7 +7,7 @@
 
 #include <vector>
 
-namespace vyr_test {
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::kControlSettingsCount;
@@ -54,4 +54,4 @@ TEST(ControlSettingsTest, ExtremeValuesPassUnchanged) {
 }
 
 }  // namespace
-}  // namespace vyr_test
+}  // namespace vyr_test::service

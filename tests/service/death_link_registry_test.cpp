@@ -12,17 +12,17 @@
 #include "ignoring_callback.h"
 #include "process_fixture.h"
 
-namespace vyr_test {
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::ClientEntry;
 using android::vyr::binder::DeathCookie;
 using android::vyr::binder::DeathLinkRegistry;
-using vyr_binder_test::DeathLog;
-using vyr_binder_test::Eventually;
+using binder::DeathLog;
+using binder::Eventually;
 
 // The registry against binders of other processes, which die when the test kills them.
-class DeathLinkRegistryTest : public vyr_binder_test::CrossProcessTest {
+class DeathLinkRegistryTest : public binder::CrossProcessTest {
   protected:
     // A client whose callback is the binder of a new server process.
     std::unique_ptr<ClientEntry> RemoteClient(const std::string& name, pid_t* pid) {
@@ -114,4 +114,4 @@ TEST_F(DeathLinkRegistryTest, ARegistryDestroyedWithLiveLinksLeavesNoNoticeBehin
 }
 
 }  // namespace
-}  // namespace vyr_test
+}  // namespace vyr_test::service

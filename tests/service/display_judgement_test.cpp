@@ -7,7 +7,7 @@
 
 #include "display_state.h"
 
-namespace vyr_test {
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::DisplayState;
@@ -51,4 +51,4 @@ TEST(DisplayJudgementTest, AFullBufferKeepsItsLastByteForTheTerminator) {
 }
 
 }  // namespace
-}  // namespace vyr_test
+}  // namespace vyr_test::service

@@ -9,6 +9,7 @@
 
 #include <nlohmann/json.hpp>
 
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::DumpValue;
@@ -100,3 +101,4 @@ TEST(DumpValueTest, TextShowsBytesThatAreNotUtf8AndControlsAsEscapes) {
 }
 
 }  // namespace
+}  // namespace vyr_test::service

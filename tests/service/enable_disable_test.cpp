@@ -1,10 +1,17 @@
 // Copyright (C) 2026 The vyrservice Authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "service_test_fixture.h"
+#include <android/log.h>
 
-namespace vyr_service_test {
+#include "sensor_doubles.h"
+#include "service_fixture.h"
+#include "vyrservice_test_peer.h"
+#include "work_log.h"
+
+namespace vyr_test::service {
 namespace {
+
+using namespace std::chrono_literals;
 
 using sensor_doubles::CallsNamed;
 using sensor_doubles::CountOf;
@@ -12,7 +19,7 @@ using sensor_doubles::kAlsDisable;
 using sensor_doubles::kAlsReadSingleShot;
 using sensor_doubles::WaitForCalls;
 
-using EnableDisableTest = ServiceTest;
+using EnableDisableTest = ServiceFixture;
 
 TEST_F(EnableDisableTest, EnableLogsAndQueuesForTheModesWorker) {
     MakeService();
@@ -44,7 +51,7 @@ TEST_F(EnableDisableTest, PeriodBelowOneBecomesOneSecond) {
         const int32_t handle = OpenAndEnable(1, period);
         EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_INFO,
                                   vyr_test::EnableWorkLine(1, 1, handle, 1000, 1000, 0)));
-        EXPECT_EQ(1000, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).active_period);
+        EXPECT_EQ(1000, ServicePeer::SnapshotModeBlock(*service_, 0).active_period);
         DisableAndWait(handle);
         ASSERT_TRUE(service_->Close(handle).isOk());
     }
@@ -151,4 +158,4 @@ TEST_F(EnableDisableTest, LowPowerIsServiceWide) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

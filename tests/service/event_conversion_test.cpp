@@ -5,7 +5,7 @@
 
 #include <gtest/gtest.h>
 
-namespace vyr_service_test {
+namespace vyr_test::service {
 namespace {
 
 using aidl::android::vyr::Event;
@@ -116,4 +116,4 @@ TEST(EventConversionTest, ZoneCountBeyondTheZoneArrayReadsOnlyTheArray) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

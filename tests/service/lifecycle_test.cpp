@@ -1,6 +1,7 @@
 // Copyright (C) 2026 The vyrservice Authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include <android/log.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -11,11 +12,17 @@
 #include <fstream>
 #include <thread>
 
-#include "service_test_fixture.h"
+#include "recording_callback.h"
+#include "sensor_doubles.h"
+#include "service_fixture.h"
 #include "test_files.h"
+#include "thread_count.h"
 
-namespace vyr_service_test {
+namespace vyr_test::service {
 namespace {
+
+using namespace std::chrono_literals;
+using android::vyr::binder::ServiceConfig;
 
 using sensor_doubles::Calls;
 using sensor_doubles::CountOf;
@@ -26,7 +33,7 @@ using sensor_doubles::kRangeDestroy;
 using sensor_doubles::kRangeEnable;
 using sensor_doubles::kRangeInit;
 
-using LifecycleTest = ServiceTest;
+using LifecycleTest = ServiceFixture;
 
 constexpr char kAlsMissing[] = "SpectralSensor::Create() returned NULL.";
 constexpr char kRangeMissing[] = "ubk::RangeSensor::Create() returned NULL.";
@@ -184,12 +191,11 @@ TEST_F(LifecycleTest, QueuedItemsAreDiscardedAtDestruction) {
     ASSERT_EQ(0, Enable(first, 100));
     ASSERT_TRUE(sensor_doubles::WaitUntilHeld(kRangeInit, kWait));
     ASSERT_EQ(0, Enable(second, 100));
-    service_.reset();
 
     std::atomic<pid_t> destroyer{0};
     std::thread destroy([this, &destroyer] {
         destroyer = static_cast<pid_t>(syscall(SYS_gettid));
-        impl_.reset();
+        service_.reset();
     });
     while (destroyer == 0) std::this_thread::yield();
     EXPECT_TRUE(WaitUntilSleeping(destroyer, kWait));
@@ -230,4 +236,4 @@ TEST(ServiceConfigTest, ProductionConfiguration) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

@@ -1,15 +1,23 @@
 // Copyright (C) 2026 The vyrservice Authors
 // SPDX-License-Identifier: Apache-2.0
 
+#include <android/log.h>
+
 #include <cstdlib>
 #include <set>
 
-#include "service_test_fixture.h"
+#include "recording_callback.h"
+#include "sensor_doubles.h"
+#include "service_fixture.h"
+#include "thread_count.h"
+#include "vyrservice_test_peer.h"
 
-namespace vyr_service_test {
+namespace vyr_test::service {
 namespace {
 
-using OpenCloseTest = ServiceTest;
+using aidl::android::vyr::Event;
+
+using OpenCloseTest = ServiceFixture;
 
 TEST_F(OpenCloseTest, InvalidModesAreRefused) {
     MakeService();
@@ -123,7 +131,7 @@ TEST_F(OpenCloseTest, CloseOfEnabledClientEndsNotificationButKeepsEnableCount) {
     EXPECT_TRUE(WaitForThreadCount(idle_threads, kWait)) << vyr_test::ThreadNames();
     EXPECT_EQ(1, callback.use_count());
 
-    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2);
+    const auto block = ServicePeer::SnapshotModeBlock(*service_, 2);
     EXPECT_EQ(1, block.enable_count);
     EXPECT_TRUE(block.running);
     EXPECT_EQ(1u, block.periods.count(handle));
@@ -140,7 +148,7 @@ TEST_F(OpenCloseTest, EmptyCallbackIsRefused) {
     // Still a polling client: enabling starts the processing thread and no notification thread.
     ASSERT_EQ(0, Enable(handle, 100));
     ASSERT_TRUE(WaitForWorkLog("EnableWork", handle));
-    vyr_test::ServicePeer::SnapshotModeBlock(*impl_, BlockOf(3));
+    ServicePeer::SnapshotModeBlock(*service_, BlockOf(3));
     EXPECT_EQ(baseline_threads_ + 2, ThreadCount());
     DisableAndWait(handle);
 }
@@ -206,18 +214,18 @@ TEST_F(OpenCloseTest, NoModeSelectsTheMiddleBlock) {
     MakeService();
     const int32_t als = OpenAndEnable(1, 100);
     const int32_t range = OpenAndEnable(3, 200);
-    const auto middle = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 1);
+    const auto middle = ServicePeer::SnapshotModeBlock(*service_, 1);
     EXPECT_FALSE(middle.running);
     EXPECT_EQ(0, middle.mode);
     EXPECT_EQ(0, middle.enable_count);
     EXPECT_EQ(1000, middle.active_period);
     EXPECT_TRUE(middle.periods.empty());
-    EXPECT_EQ(1, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).mode);
-    EXPECT_EQ(3, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).mode);
+    EXPECT_EQ(1, ServicePeer::SnapshotModeBlock(*service_, 0).mode);
+    EXPECT_EQ(3, ServicePeer::SnapshotModeBlock(*service_, 2).mode);
     DisableAndWait(als);
     DisableAndWait(range);
-    EXPECT_EQ(0, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 1).enable_count);
+    EXPECT_EQ(0, ServicePeer::SnapshotModeBlock(*service_, 1).enable_count);
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

@@ -1,10 +1,16 @@
 // Copyright (C) 2026 The vyrservice Authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "service_test_fixture.h"
+#include <android/log.h>
 
-namespace vyr_service_test {
+#include "sensor_doubles.h"
+#include "service_fixture.h"
+
+namespace vyr_test::service {
 namespace {
+
+using namespace std::chrono_literals;
+using aidl::android::vyr::Event;
 
 using sensor_doubles::Call;
 using sensor_doubles::CallsNamed;
@@ -16,7 +22,7 @@ using sensor_doubles::SetDelay;
 using sensor_doubles::WaitForCalls;
 using std::chrono::milliseconds;
 
-using ProcessLoopTest = ServiceTest;
+using ProcessLoopTest = ServiceFixture;
 
 milliseconds Between(const Call& earlier, const Call& later) {
     return std::chrono::duration_cast<milliseconds>(later.time - earlier.time);
@@ -183,4 +189,4 @@ TEST_F(ProcessLoopTest, NewSampleIsOfferedToEveryHandleOnce) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

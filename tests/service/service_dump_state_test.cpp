@@ -11,7 +11,7 @@
 #include <string>
 #include <unordered_map>
 
-namespace vyr_test {
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::ClientEntry;
@@ -147,4 +147,4 @@ TEST(ServiceDumpStateTest, WorkQueuesShowDepthAndWhatWasApplied) {
 }
 
 }  // namespace
-}  // namespace vyr_test
+}  // namespace vyr_test::service

@@ -32,15 +32,13 @@
 #include "ignoring_callback.h"
 #include "test_files.h"
 
+namespace vyr_test::service {
 namespace {
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
 using aidl::android::vyr::IVYRService;
 using namespace std::chrono_literals;
-using vyr_test::ChildProcess;
-using vyr_test::MakeTempDir;
-using vyr_test::ReadFile;
 
 constexpr char kServiceName[] = "vyrservice";
 constexpr char kCallbackClientFlag[] = "--callback-client";
@@ -297,14 +295,16 @@ int RunCallbackClient() {
 }
 
 }  // namespace
+}  // namespace vyr_test::service
 
 int main(int argc, char** argv) {
+    using namespace vyr_test::service;
     g_self = std::filesystem::canonical("/proc/self/exe").string();
     if (argc > 1 && strcmp(argv[1], kCallbackClientFlag) == 0) {
         return RunCallbackClient();
     }
     ::testing::InitGoogleTest(&argc, argv);
-    g_work_dir = MakeTempDir("vyr-service-process-");
+    g_work_dir = vyr_test::MakeTempDir("vyr-service-process-");
     std::filesystem::create_directory(g_work_dir + "/binder");
     setenv("VYR_BINDER_DIR", (g_work_dir + "/binder").c_str(), 1);
     const int status = RUN_ALL_TESTS();

@@ -15,9 +15,11 @@
 #include <string>
 #include <vector>
 
-#include "service_test_fixture.h"
+#include "recording_callback.h"
+#include "sensor_doubles.h"
+#include "service_fixture.h"
 
-namespace vyr_service_test {
+namespace vyr_test::service {
 namespace {
 
 std::mutex g_trace_mutex;
@@ -56,30 +58,30 @@ class TraceCapture {
 };
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service
 
 extern "C" {
 uint64_t atrace_get_enabled_tags() {
-    std::lock_guard<std::mutex> lock(vyr_service_test::g_trace_mutex);
-    return vyr_service_test::g_capturing ? ATRACE_TAG_CAMERA : 0;
+    std::lock_guard<std::mutex> lock(vyr_test::service::g_trace_mutex);
+    return vyr_test::service::g_capturing ? ATRACE_TAG_CAMERA : 0;
 }
 void atrace_begin_body(const char* name) {
-    vyr_service_test::Record(std::string("B ") + name);
+    vyr_test::service::Record(std::string("B ") + name);
 }
 void atrace_end_body() {
-    vyr_service_test::Record("E");
+    vyr_test::service::Record("E");
 }
 void atrace_int_body(const char* name, int32_t value) {
-    vyr_service_test::Record(std::string("C ") + name + "=" + std::to_string(value));
+    vyr_test::service::Record(std::string("C ") + name + "=" + std::to_string(value));
 }
 }
 
-namespace vyr_service_test {
+namespace vyr_test::service {
 namespace {
 
 using sensor_doubles::kRangeProcess;
 using sensor_doubles::WaitForCalls;
-using TracePointsTest = ServiceTest;
+using TracePointsTest = ServiceFixture;
 
 // Every slice that begins ends, and none ends before it began: over all threads together, the
 // "E" entries never outnumber the "B" entries before them.
@@ -127,4 +129,4 @@ TEST_F(TracePointsTest, WorkReadsDeliveriesAndCountersAreTraced) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

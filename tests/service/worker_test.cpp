@@ -1,9 +1,15 @@
 // Copyright (C) 2026 The vyrservice Authors
 // SPDX-License-Identifier: Apache-2.0
 
-#include "service_test_fixture.h"
+#include <android/log.h>
 
-namespace vyr_service_test {
+#include "sensor_doubles.h"
+#include "service_fixture.h"
+#include "thread_count.h"
+#include "vyrservice_test_peer.h"
+#include "work_log.h"
+
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::WorkItem;
@@ -19,7 +25,7 @@ using sensor_doubles::kRangeProcess;
 using sensor_doubles::kRangeUninit;
 using sensor_doubles::WaitForCalls;
 
-using WorkerTest = ServiceTest;
+using WorkerTest = ServiceFixture;
 
 // Range-library calls other than Process, in order, as "Name(args)".
 std::vector<std::string> RangeSwitching() {
@@ -48,7 +54,7 @@ TEST_F(WorkerTest, ActivePeriodIsTheSmallestAndRecomputedOnDisable) {
     DisableAndWait(second);
     EXPECT_TRUE(
         log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(3, 1, second, 200, 1)));
-    EXPECT_EQ(200, vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).active_period);
+    EXPECT_EQ(200, ServicePeer::SnapshotModeBlock(*service_, 2).active_period);
     DisableAndWait(first);
     EXPECT_TRUE(
         log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(3, 0, first, 200, 1)));
@@ -65,25 +71,25 @@ TEST_F(WorkerTest, RecomputedActivePeriodIsCappedAtFiveSeconds) {
     DisableAndWait(first);
     EXPECT_TRUE(
         log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(1, 1, first, 5000, 0)));
-    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0);
+    const auto block = ServicePeer::SnapshotModeBlock(*service_, 0);
     EXPECT_EQ(5000, block.active_period);
     EXPECT_TRUE(block.running);
     DisableAndWait(second);
     // The last period stays after sampling stops.
     EXPECT_TRUE(
         log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(1, 0, second, 5000, 0)));
-    EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 0).running);
+    EXPECT_FALSE(ServicePeer::SnapshotModeBlock(*service_, 0).running);
 }
 
 TEST_F(WorkerTest, DisableWithoutEnableMakesTheCountNegative) {
     MakeService();
-    vyr_test::ServicePeer::PushWorkItem(*impl_, WorkItem{false, 3, 77, 0});
+    ServicePeer::PushWorkItem(*service_, WorkItem{false, 3, 77, 0});
     ASSERT_TRUE(WaitForWorkLog("DisableWork", 77));
     EXPECT_TRUE(log_.Contains(kTag, ANDROID_LOG_WARN,
                               "DisableWork: mode 3 enable count becomes negative (-1)"));
     EXPECT_TRUE(
         log_.Contains(kTag, ANDROID_LOG_INFO, vyr_test::DisableWorkLine(3, -1, 77, 1000, 1)));
-    const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2);
+    const auto block = ServicePeer::SnapshotModeBlock(*service_, 2);
     EXPECT_EQ(-1, block.enable_count);
     EXPECT_FALSE(block.running);
     EXPECT_EQ((std::vector<std::string>{"RangeSensor::Enable(0)", "RangeSensor::Uninit()"}),
@@ -121,12 +127,12 @@ TEST_F(WorkerTest, FailedInitStartsNoProcessingThread) {
     const size_t threads = ThreadCount();
     const int32_t handle = OpenAndEnable(3, 50);
     // The snapshot waits for the worker to finish the item.
-    EXPECT_TRUE(vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).running);
+    EXPECT_TRUE(ServicePeer::SnapshotModeBlock(*service_, 2).running);
     EXPECT_EQ(threads, ThreadCount());
     EXPECT_EQ(1u, CountOf(kRangeEnable));
     DisableAndWait(handle);
     EXPECT_EQ(0u, CountOf(kRangeProcess));
-    EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*impl_, 2).running);
+    EXPECT_FALSE(ServicePeer::SnapshotModeBlock(*service_, 2).running);
 }
 
 TEST_F(WorkerTest, AmbientLightFlagFollowsTheFirstEnableAndTheLastDisable) {
@@ -187,4 +193,4 @@ TEST_F(WorkerTest, ItemsOfOneWorkerAreAppliedInQueueOrder) {
 }
 
 }  // namespace
-}  // namespace vyr_service_test
+}  // namespace vyr_test::service

@@ -9,7 +9,6 @@
 
 #include <filesystem>
 #include <fstream>
-#include <sstream>
 #include <thread>
 
 #include "test_files.h"
@@ -83,13 +82,7 @@ bool ServiceProcess::Running() {
 }
 
 std::map<std::string, std::string> ServiceProcess::SensorState() const {
-    std::map<std::string, std::string> state;
-    std::istringstream lines(ReadFile(dir_ + "/sensor_state"));
-    for (std::string line; std::getline(lines, line);) {
-        size_t eq = line.find('=');
-        if (eq != std::string::npos) state[line.substr(0, eq)] = line.substr(eq + 1);
-    }
-    return state;
+    return ReadKeyValues(dir_ + "/sensor_state");
 }
 
 bool ServiceProcess::WaitForSensorState(const std::string& key, const std::string& value,
@@ -118,12 +111,7 @@ bool ServiceProcess::WaitForLog(const std::string& text, milliseconds timeout) c
 }
 
 long ServiceProcess::RssKib() const {
-    std::ifstream status("/proc/" + std::to_string(pid()) + "/status");
-    std::string line;
-    while (std::getline(status, line)) {
-        if (line.rfind("VmRSS:", 0) == 0) return std::strtol(line.c_str() + 6, nullptr, 10);
-    }
-    return -1;
+    return ResidentKib(pid());
 }
 
 size_t ServiceProcess::LogCount(const std::string& text) const {

@@ -9,16 +9,17 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <map>
 #include <string>
 
 #include "test_files.h"
+
+namespace vyr_test {
 
 // A private directory for one test's files, removed with everything in it.
 class TempDir {
   public:
     TempDir() {
-        path_ = vyr_test::MakeTempDir("vyr_test_");
+        path_ = MakeTempDir("vyr_test_");
         if (path_.empty()) ADD_FAILURE() << "cannot make a temporary directory";
     }
     ~TempDir() {
@@ -39,14 +40,4 @@ class TempDir {
     std::string path_;
 };
 
-// `key=value` lines of a file; empty when it cannot be read.
-inline std::map<std::string, std::string> ReadKeyValues(const std::string& path) {
-    std::map<std::string, std::string> values;
-    std::ifstream file(path);
-    std::string line;
-    while (std::getline(file, line)) {
-        const size_t equals = line.find('=');
-        if (equals != std::string::npos) values[line.substr(0, equals)] = line.substr(equals + 1);
-    }
-    return values;
-}
+}  // namespace vyr_test

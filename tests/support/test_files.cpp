@@ -3,10 +3,12 @@
 
 #include "test_files.h"
 
+#include <android-base/strings.h>
 #include <limits.h>
 #include <stdlib.h>
 #include <unistd.h>
 
+#include <cstdio>
 #include <fstream>
 #include <sstream>
 #include <vector>
@@ -32,6 +34,31 @@ std::string ReadFile(const std::string& path) {
     std::stringstream text;
     text << in.rdbuf();
     return text.str();
+}
+
+std::vector<std::string> SplitLines(const std::string& text) {
+    std::vector<std::string> lines = android::base::Split(text, "\n");
+    // What follows the last newline is a line only if it is not empty.
+    if (lines.back().empty()) lines.pop_back();
+    return lines;
+}
+
+std::map<std::string, std::string> ReadKeyValues(const std::string& path) {
+    std::map<std::string, std::string> values;
+    for (const std::string& line : SplitLines(ReadFile(path))) {
+        const size_t equals = line.find('=');
+        if (equals != std::string::npos) values[line.substr(0, equals)] = line.substr(equals + 1);
+    }
+    return values;
+}
+
+long ResidentKib(pid_t pid) {
+    for (const std::string& line :
+         SplitLines(ReadFile("/proc/" + std::to_string(pid) + "/status"))) {
+        long kib = 0;
+        if (sscanf(line.c_str(), "VmRSS: %ld kB", &kib) == 1) return kib;
+    }
+    return -1;
 }
 
 std::string ProgramBesideThisOne(const std::string& name) {

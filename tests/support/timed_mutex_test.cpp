@@ -14,6 +14,7 @@
 using namespace std::chrono_literals;
 using Clock = std::chrono::steady_clock;
 
+namespace vyr_test {
 namespace {
 
 TEST(TimedMutexTest, TryLockForGuardsSharedData) {
@@ -69,3 +70,4 @@ TEST(TimedMutexTest, TryLockUntilAPastDeadlineStillTakesAFreeMutex) {
 }
 
 }  // namespace
+}  // namespace vyr_test

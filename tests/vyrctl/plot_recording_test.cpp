@@ -18,6 +18,7 @@
 #include "temp_dir.h"
 #include "test_files.h"
 
+namespace vyr_test::vyrctl {
 namespace {
 
 constexpr std::chrono::milliseconds kWait{60000};
@@ -105,3 +106,4 @@ TEST_F(PlotRecordingTest, ABadLineIsRefusedWithItsFileAndLine) {
 }
 
 }  // namespace
+}  // namespace vyr_test::vyrctl

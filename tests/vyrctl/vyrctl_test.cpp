@@ -4,6 +4,7 @@
 // Unit tests of vyrctl's parsing, decoding and shell, against an in-process fake service.
 
 #include <aidl/android/vyr/BnVYRService.h>
+#include <android-base/file.h>
 #include <gtest/gtest.h>
 
 #include <cstdio>
@@ -15,9 +16,12 @@
 #include "line_writer.h"
 #include "options.h"
 #include "shell.h"
+#include "test_files.h"
 
-namespace vyrctl {
+namespace vyr_test::vyrctl {
 namespace {
+
+using namespace ::vyrctl;
 
 using aidl::android::vyr::Event;
 using aidl::android::vyr::IEventCallback;
@@ -115,15 +119,11 @@ class ShellTest : public ::testing::Test {
     }
 
     static std::vector<std::string> ReadLines(FILE* file) {
+        // Writes out what the stream still holds and goes back to the start of the file.
         rewind(file);
-        std::vector<std::string> lines;
-        char buffer[1024];
-        while (fgets(buffer, sizeof(buffer), file)) {
-            std::string line = buffer;
-            if (!line.empty() && line.back() == '\n') line.pop_back();
-            lines.push_back(line);
-        }
-        return lines;
+        std::string text;
+        EXPECT_TRUE(android::base::ReadFdToString(fileno(file), &text));
+        return SplitLines(text);
     }
 
     std::shared_ptr<FakeService> service_ = ndk::SharedRefBase::make<FakeService>();
@@ -343,4 +343,4 @@ TEST_F(ShellTest, HandlesLeftOpenAreDisabledAndClosed) {
 }
 
 }  // namespace
-}  // namespace vyrctl
+}  // namespace vyr_test::vyrctl

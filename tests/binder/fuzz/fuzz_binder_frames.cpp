@@ -24,6 +24,7 @@
 #include "process_state.h"
 #include "wire.h"
 
+namespace vyr_test::binder {
 namespace {
 
 using aidl::android::vyr::BnVYRService;
@@ -189,8 +190,10 @@ void FuzzReads(const uint8_t* data, size_t size) {
 }
 
 }  // namespace
+}  // namespace vyr_test::binder
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+    using namespace vyr_test::binder;
     if (size < 1) return 0;
     switch (data[0] % 4) {
         case 0:

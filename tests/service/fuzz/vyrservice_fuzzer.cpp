@@ -17,6 +17,7 @@
 #include "service_config.h"
 #include "vyrservice.h"
 
+namespace vyr_test::service {
 namespace {
 
 using android::vyr::binder::ServiceConfig;
@@ -38,8 +39,10 @@ std::shared_ptr<VYRService> Service() {
 }
 
 }  // namespace
+}  // namespace vyr_test::service
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+    using namespace vyr_test::service;
     android::fuzzService(Service()->asBinder().get(), FuzzedDataProvider(data, size));
     return 0;
 }

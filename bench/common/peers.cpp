@@ -1,0 +1,36 @@
+// Copyright (C) 2026 The vyrservice Authors
+// SPDX-License-Identifier: Apache-2.0
+
+#include "peers.h"
+
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace vyr_bench {
+
+std::vector<int> ForkPeers(int count, void (*serve)(int fd)) {
+    std::vector<int> fds;
+    for (int i = 0; i < count; ++i) {
+        int pair[2];
+        if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, pair) != 0) {
+            EndPeers(fds);
+            return {};
+        }
+        if (fork() == 0) {
+            close(pair[0]);
+            serve(pair[1]);
+        }
+        close(pair[1]);
+        fds.push_back(pair[0]);
+    }
+    return fds;
+}
+
+void EndPeers(const std::vector<int>& fds) {
+    for (int fd : fds) close(fd);
+    while (wait(nullptr) > 0) {
+    }
+}
+
+}  // namespace vyr_bench
