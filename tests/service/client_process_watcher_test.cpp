@@ -120,9 +120,7 @@ class ClientProcessWatcherTest : public ::testing::Test {
     }
 
     std::unique_ptr<ChildProcess> Sleeper() {
-        auto child = std::make_unique<ChildProcess>(std::vector<std::string>{"/bin/sleep", "60"},
-                                                    std::map<std::string, std::string>{},
-                                                    dir_.Path("stderr"));
+        std::unique_ptr<ChildProcess> child = StartSleeper(dir_.Path("stderr"));
         EXPECT_TRUE(child->started());
         return child;
     }

@@ -30,9 +30,7 @@ constexpr std::chrono::seconds kDeadline{10};
 class ClientProcessesTest : public ::testing::Test {
   protected:
     std::unique_ptr<ChildProcess> Sleeper() {
-        auto child = std::make_unique<ChildProcess>(std::vector<std::string>{"/bin/sleep", "60"},
-                                                    std::map<std::string, std::string>{},
-                                                    dir_.Path("stderr"));
+        std::unique_ptr<ChildProcess> child = StartSleeper(dir_.Path("stderr"));
         EXPECT_TRUE(child->started());
         return child;
     }

@@ -157,4 +157,9 @@ bool ChildProcess::Running() {
     return pid_ > 0 && !Wait(milliseconds(0));
 }
 
+std::unique_ptr<ChildProcess> StartSleeper(const std::string& stderr_path) {
+    return std::make_unique<ChildProcess>(std::vector<std::string>{"/bin/sleep", "60"},
+                                          std::map<std::string, std::string>{}, stderr_path);
+}
+
 }  // namespace vyr_test

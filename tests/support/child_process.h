@@ -10,6 +10,7 @@
 
 #include <chrono>
 #include <map>
+#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
@@ -54,5 +55,8 @@ class ChildProcess {
     std::string pending_;
     std::optional<int> status_;
 };
+
+// A process that only sleeps (a minute), to be watched and killed.
+std::unique_ptr<ChildProcess> StartSleeper(const std::string& stderr_path);
 
 }  // namespace vyr_test
