@@ -17,10 +17,6 @@ using sensor_doubles::CountOf;
 using sensor_doubles::kAlsReadSingleShot;
 using sensor_doubles::WaitForCalls;
 
-std::function<bool(const vyr_test::ModeBlockSnapshot&)> EnableCountIs(int32_t count) {
-    return [count](const vyr_test::ModeBlockSnapshot& block) { return block.enable_count == count; };
-}
-
 // Steps most tests share; call them through ASSERT_NO_FATAL_FAILURE so a failed wait ends the test.
 class DisplayStateTest : public DisplayTest {
   protected:
@@ -33,13 +29,13 @@ class DisplayStateTest : public DisplayTest {
     void LightThePanel(const std::string& state = "On") {
         Panel(state);
         ASSERT_TRUE(WaitForEnableLine(state + "\n"));
-        ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+        ASSERT_TRUE(WaitForEnableCount(1));
     }
     // Shows "Off" on a lit panel and waits until nothing holds the light mode any more.
     void DarkenThePanel() {
         Panel("Off");
         ASSERT_TRUE(WaitForDisableLine("Off\n"));
-        ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
+        ASSERT_TRUE(WaitForEnableCount(0));
     }
 };
 
@@ -78,7 +74,7 @@ TEST_F(DisplayStateTest, DumpShowsTheLastPanelStateAndItsChanges) {
     text = vyr_test::DumpOf(service_->asBinder().get()).text;
     EXPECT_NE(text.find("  last_state: Off\n"), std::string::npos) << text;
     EXPECT_NE(text.find("event: display dark: Off\n"), std::string::npos) << text;
-    EXPECT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
+    EXPECT_TRUE(WaitForEnableCount(0));
 }
 
 TEST_F(DisplayStateTest, HbmIsLit) {
@@ -97,7 +93,7 @@ TEST_F(DisplayStateTest, OffLowerCaseOnAndEmptyAreDark) {
         Panel("On");
         ASSERT_TRUE(WaitForEnableLine("On\n", enabled + 1));
         if (display == 0) {
-            ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+            ASSERT_TRUE(WaitForEnableCount(1));
             display = DisplayHandle();
         }
         Panel(dark);
