@@ -12,7 +12,6 @@
 //
 // Prints "p50 X ms, p99 Y ms (N events)".
 #include <android-base/file.h>
-#include <poll.h>
 #include <time.h>
 #include <unistd.h>
 
@@ -32,9 +31,9 @@
 
 namespace {
 
-// A range event's frame and the reply to it, as the service sends and receives them.
-constexpr size_t kEventBytes = 340;
-constexpr size_t kReplyBytes = 60;
+using vyr_bench::kEventBytes;
+using vyr_bench::kReplyBytes;
+
 // Ages before this are of the start-up, not of the steady state.
 constexpr auto kSettle = std::chrono::milliseconds(1500);
 
@@ -74,13 +73,8 @@ void Echo(int fd) {
 void Sensor(const Options& options) {
     const auto period = std::chrono::milliseconds(options.period_ms);
     auto next = std::chrono::steady_clock::now() + period;
-    std::mutex mutex;
-    std::condition_variable cv;
     while (!g_stop.load()) {
-        {
-            std::unique_lock<std::mutex> lock(mutex);
-            while (std::chrono::steady_clock::now() < next) cv.wait_until(lock, next);
-        }
+        vyr_bench::WaitUntil(next);
         next += period;
         {
             std::lock_guard<std::mutex> lock(g_sample_mutex);
@@ -106,11 +100,7 @@ void Sender(int fd, std::vector<int64_t>* ages) {
             stamp = g_sample_boottime;
         }
         memcpy(event, &stamp, sizeof(stamp));
-        if (write(fd, event, sizeof(event)) != static_cast<ssize_t>(sizeof(event))) return;
-        // Waiting as the runtime does: poll, then read.
-        pollfd readable{fd, POLLIN, 0};
-        poll(&readable, 1, -1);
-        if (!android::base::ReadFully(fd, reply, sizeof(reply))) return;
+        if (!vyr_bench::RoundTrip(fd, event, reply)) return;
         int64_t age = 0;
         memcpy(&age, reply, sizeof(age));
         if (g_counting.load()) ages->push_back(age);

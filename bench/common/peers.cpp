@@ -3,9 +3,14 @@
 
 #include "peers.h"
 
+#include <android-base/file.h>
+#include <poll.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
+
+#include <condition_variable>
+#include <mutex>
 
 namespace vyr_bench {
 
@@ -31,6 +36,20 @@ void EndPeers(const std::vector<int>& fds) {
     for (int fd : fds) close(fd);
     while (wait(nullptr) > 0) {
     }
+}
+
+bool RoundTrip(int fd, const char* event, char* reply) {
+    if (write(fd, event, kEventBytes) != static_cast<ssize_t>(kEventBytes)) return false;
+    pollfd readable{fd, POLLIN, 0};
+    poll(&readable, 1, -1);
+    return android::base::ReadFully(fd, reply, kReplyBytes);
+}
+
+void WaitUntil(std::chrono::steady_clock::time_point deadline) {
+    std::mutex mutex;
+    std::condition_variable cv;
+    std::unique_lock<std::mutex> lock(mutex);
+    while (std::chrono::steady_clock::now() < deadline) cv.wait_until(lock, deadline);
 }
 
 }  // namespace vyr_bench

@@ -10,13 +10,11 @@
 //
 // Prints the process's CPU time per event delivered.
 #include <android-base/file.h>
-#include <poll.h>
 #include <time.h>
 #include <unistd.h>
 
 #include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstdio>
 #include <mutex>
 #include <thread>
@@ -27,9 +25,8 @@
 
 namespace {
 
-// A range event's frame and the reply to it, as the service sends and receives them.
-constexpr size_t kEventBytes = 340;
-constexpr size_t kReplyBytes = 60;
+using vyr_bench::kEventBytes;
+using vyr_bench::kReplyBytes;
 
 struct Options {
     int clients = 10;
@@ -53,24 +50,11 @@ void Echo(int fd) {
     _exit(0);
 }
 
-void TimedWait(std::chrono::milliseconds period) {
-    std::mutex mutex;
-    std::condition_variable cv;
-    const auto deadline = std::chrono::steady_clock::now() + period;
-    std::unique_lock<std::mutex> lock(mutex);
-    while (std::chrono::steady_clock::now() < deadline) cv.wait_until(lock, deadline);
-}
-
 void Sensor(const Options& options) {
     const auto period = std::chrono::nanoseconds(1000000000LL / options.frame_hz);
     auto next = std::chrono::steady_clock::now() + period;
-    std::mutex mutex;
-    std::condition_variable cv;
     while (!g_stop.load(std::memory_order_relaxed)) {
-        {
-            std::unique_lock<std::mutex> lock(mutex);
-            while (std::chrono::steady_clock::now() < next) cv.wait_until(lock, next);
-        }
+        vyr_bench::WaitUntil(next);
         next += period;
         std::lock_guard<std::mutex> lock(g_sample_mutex);
         ++g_sample;
@@ -92,14 +76,11 @@ void Client(const Options& options, int fd, int index) {
         }
         if (sample != taken) {
             taken = sample;
-            if (write(fd, event, sizeof(event)) != static_cast<ssize_t>(sizeof(event))) return;
-            // Waiting as the runtime does: poll, then read.
-            pollfd readable{fd, POLLIN, 0};
-            poll(&readable, 1, -1);
-            if (!android::base::ReadFully(fd, reply, sizeof(reply))) return;
+            if (!vyr_bench::RoundTrip(fd, event, reply)) return;
             g_events.fetch_add(1, std::memory_order_relaxed);
         }
-        TimedWait(std::chrono::milliseconds(options.period_ms));
+        vyr_bench::WaitUntil(std::chrono::steady_clock::now() +
+                             std::chrono::milliseconds(options.period_ms));
     }
 }
 

@@ -80,6 +80,14 @@ class EventRecordTest : public ::testing::Test {
         EXPECT_EQ(Fields(calls[0].new_info), Fields(std::set<Info>{ActiveInfo(kPackage, version)}));
     }
 
+    // After a change to version 2 and records that must not re-read the list: had any of them
+    // re-read it, version 2 would have been reported already, before this change to version 3.
+    void ExpectNoReReadSoFar() {
+        ChangeList(3);
+        ASSERT_TRUE(feed_.SendRecords({IN_MODIFY}));
+        ExpectOneCallbackTo(3);
+    }
+
     vyr_test::LogCapture log_;
     TempInfoList list_;
     EventFeed feed_;
@@ -116,11 +124,7 @@ TEST_F(EventRecordTest, CreateWithDeleteLogsCreatedOnlyAndDoesNotReRead) {
     SendBarrierAndWait();
     EXPECT_EQ(log_.Count(kLogTag, ANDROID_LOG_INFO, Line("created", "file")), 1u);
     EXPECT_EQ(log_.Count(kLogTag, ANDROID_LOG_INFO, Line("deleted", "file")), 0u);
-
-    // Had either record re-read the list, version 2 would have been reported already.
-    ChangeList(3);
-    ASSERT_TRUE(feed_.SendRecords({IN_MODIFY}));
-    ExpectOneCallbackTo(3);
+    ExpectNoReReadSoFar();
 }
 
 TEST_F(EventRecordTest, DeleteAloneLogsDeletedAndDoesNotReRead) {
@@ -129,9 +133,7 @@ TEST_F(EventRecordTest, DeleteAloneLogsDeletedAndDoesNotReRead) {
     SendBarrierAndWait();
     EXPECT_EQ(ListenerLines(),
               (std::vector<std::string>{Line("deleted", "file"), Line("created", "directory")}));
-    ChangeList(3);
-    ASSERT_TRUE(feed_.SendRecords({IN_MODIFY}));
-    ExpectOneCallbackTo(3);
+    ExpectNoReReadSoFar();
 }
 
 TEST_F(EventRecordTest, DeleteModifyIsLoggedAsDeletedAndNotReRead) {
@@ -139,9 +141,7 @@ TEST_F(EventRecordTest, DeleteModifyIsLoggedAsDeletedAndNotReRead) {
     ASSERT_TRUE(feed_.SendRecords({IN_DELETE | IN_MODIFY}));
     SendBarrierAndWait();
     EXPECT_EQ(log_.Count(kLogTag, ANDROID_LOG_INFO, Line("modified", "file")), 0u);
-    ChangeList(3);
-    ASSERT_TRUE(feed_.SendRecords({IN_MODIFY}));
-    ExpectOneCallbackTo(3);
+    ExpectNoReReadSoFar();
 }
 
 TEST_F(EventRecordTest, OtherEventsReReadWithoutALine) {
@@ -188,9 +188,7 @@ TEST_F(EventRecordTest, ShortReadIsIgnored) {
     ASSERT_TRUE(feed_.Send(EventFeed::Record(IN_MODIFY).substr(0, 15)));
     SendBarrierAndWait();
     EXPECT_EQ(ListenerLines(), std::vector<std::string>{Line("created", "directory")});
-    ChangeList(3);
-    ASSERT_TRUE(feed_.SendRecords({IN_MODIFY}));
-    ExpectOneCallbackTo(3);
+    ExpectNoReReadSoFar();
 }
 
 TEST_F(EventRecordTest, FailedReReadKeepsTheRecords) {

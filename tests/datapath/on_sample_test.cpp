@@ -123,17 +123,27 @@ class OnSampleTest : public DataPathTest {
     uint64_t SamplesStored() {
         return vyr_test::ServicePeer::SamplesStored(*service_, kRangeBlock);
     }
-    // A client enabled on sample at 1 ms that holds every sample, beside a poller whose held
-    // sampling lets the test publish each one: its handle.
-    int32_t StartHoldingClient(std::shared_ptr<RecordingCallback>* callback) {
-        const int32_t poller = Open(kRange);
-        const int32_t pusher = Open(kRange);
-        for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
-        *callback = SetCallbackOk(pusher);
+    struct PollerAndPusher {
+        int32_t poller;
+        int32_t pusher;
+        std::shared_ptr<RecordingCallback> callback;
+    };
+    // A poller whose held sampling at 1 ms lets the test publish each sample, beside a pusher
+    // with a callback that is not enabled yet.
+    PollerAndPusher StartPollerAndPusher() {
+        PollerAndPusher clients{Open(kRange), Open(kRange), nullptr};
+        for (int32_t handle : {clients.poller, clients.pusher}) EXPECT_GT(handle, 0);
+        clients.callback = SetCallbackOk(clients.pusher);
         sensor_doubles::SetRangeData(RangeFrame(0));
-        StartHeldSampling(poller, kRange);
-        EXPECT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
-        return pusher;
+        StartHeldSampling(clients.poller, kRange);
+        return clients;
+    }
+    // A pusher enabled on sample at 1 ms that holds every sample: its handle.
+    int32_t StartHoldingClient(std::shared_ptr<RecordingCallback>* callback) {
+        const PollerAndPusher clients = StartPollerAndPusher();
+        *callback = clients.callback;
+        EXPECT_EQ(EnableOnSample(clients.pusher, 1, kNeverDue), 0);
+        return clients.pusher;
     }
     void Publish(uint32_t time_ms) {
         sensor_doubles::SetRangeData(RangeFrame(time_ms));
@@ -144,12 +154,7 @@ class OnSampleTest : public DataPathTest {
 };
 
 TEST_F(OnSampleTest, ClientAtThreeTimesTheActivePeriodGetsEveryThirdSample) {
-    const int32_t poller = Open(kRange);
-    const int32_t pusher = Open(kRange);
-    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
-    auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(RangeFrame(0));
-    StartHeldSampling(poller, kRange);  // samples at 1 ms
+    const auto [poller, pusher, callback] = StartPollerAndPusher();
     const int64_t enabled_at = BootTimeNs();
     ASSERT_EQ(EnableOnSample(pusher, 3, 0), 0);
 
@@ -171,12 +176,7 @@ TEST_F(OnSampleTest, ClientAtThreeTimesTheActivePeriodGetsEveryThirdSample) {
 }
 
 TEST_F(OnSampleTest, ChangeOfTheActivePeriodChangesTheStride) {
-    const int32_t poller = Open(kRange);
-    const int32_t pusher = Open(kRange);
-    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
-    auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(RangeFrame(0));
-    StartHeldSampling(poller, kRange);
+    const auto [poller, pusher, callback] = StartPollerAndPusher();
     ASSERT_EQ(EnableOnSample(pusher, 3, 0), 0);
     for (uint32_t t = 1; t <= 3; ++t) Publish(t);
     ASSERT_TRUE(callback->WaitForEvents(1, kWait));
@@ -272,12 +272,7 @@ TEST_F(OnSampleTest, RefusedRequestsSayWhy) {
 }
 
 TEST_F(OnSampleTest, DisableEndsTheDeliveryThread) {
-    const int32_t poller = Open(kRange);
-    const int32_t pusher = Open(kRange);
-    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
-    auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(RangeFrame(0));
-    StartHeldSampling(poller, kRange);
+    const auto [poller, pusher, callback] = StartPollerAndPusher();
     const size_t sampling_threads = vyr_test::ThreadCount();
     ASSERT_EQ(EnableOnSample(pusher, 1, 0), 0);
     Publish(1);
@@ -293,12 +288,7 @@ TEST_F(OnSampleTest, DisableEndsTheDeliveryThread) {
 }
 
 TEST_F(OnSampleTest, DeathOfTheClientEndsItsDelivery) {
-    const int32_t poller = Open(kRange);
-    const int32_t pusher = Open(kRange);
-    for (int32_t handle : {poller, pusher}) EXPECT_GT(handle, 0);
-    auto callback = SetCallbackOk(pusher);
-    sensor_doubles::SetRangeData(RangeFrame(0));
-    StartHeldSampling(poller, kRange);
+    const auto [poller, pusher, callback] = StartPollerAndPusher();
     const size_t sampling_threads = vyr_test::ThreadCount();
     ASSERT_EQ(EnableOnSample(pusher, 1, kNeverDue), 0);
     Publish(1);

@@ -7,6 +7,8 @@
 #include <android/log.h>
 
 #include <cstdint>
+#include <string>
+#include <utility>
 #include <vector>
 
 #include "data_path_fixture.h"
@@ -117,14 +119,42 @@ void ExpectSentinel(const Event& event) {
     EXPECT_EQ(event.data, std::vector<float>{42.0f});
 }
 
-class PollTest : public DataPathTest {};
+class PollTest : public DataPathTest {
+  protected:
+    // A client of `mode` sampling with its reads held, so the sample set beforehand stays the one
+    // stored: its handle.
+    int32_t OpenSampling(int32_t mode) {
+        const int32_t handle = Open(mode);
+        EXPECT_GT(handle, 0);
+        StartHeldSampling(handle, mode);
+        return handle;
+    }
+    // Two range clients, both open before the first starts sampling with its reads held, so the
+    // second has not taken the stored sample: their handles.
+    std::pair<int32_t, int32_t> OpenSamplerAndIdle() {
+        const int32_t sampler = Open(kRange);
+        const int32_t idle = Open(kRange);
+        for (int32_t handle : {sampler, idle}) EXPECT_GT(handle, 0);
+        StartHeldSampling(sampler, kRange);
+        return {sampler, idle};
+    }
+    // Polls `handle` twice where it has no valid sample to take: each poll leaves the event alone,
+    // and the invalid data is logged once in all.
+    void ExpectInvalidDataLoggedOnce(int32_t handle) {
+        for (int poll = 1; poll <= 2; ++poll) {
+            SCOPED_TRACE("poll " + std::to_string(poll));
+            Event event = Sentinel();
+            EXPECT_EQ(Poll(handle, &event), -61);
+            ExpectSentinel(event);
+            EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
+        }
+    }
+};
 
 TEST_F(PollTest, RangeEventWithTwoZonesHoldsEveryFieldAsConverted) {
     MultiRangingData frame = ExtremeFrame(2);
     sensor_doubles::SetRangeData(frame);
-    int32_t handle = Open(kRange);
-    EXPECT_GT(handle, 0);
-    StartHeldSampling(handle, kRange);
+    const int32_t handle = OpenSampling(kRange);
 
     Event event = Sentinel();
     ASSERT_EQ(Poll(handle, &event), 0);
@@ -144,9 +174,7 @@ TEST_F(PollTest, RangeEventWithTwoZonesHoldsEveryFieldAsConverted) {
 TEST_F(PollTest, RangeEventWithNoZonesHoldsTheHeaderOnly) {
     MultiRangingData frame = ExtremeFrame(0);
     sensor_doubles::SetRangeData(frame);
-    int32_t handle = Open(kRange);
-    EXPECT_GT(handle, 0);
-    StartHeldSampling(handle, kRange);
+    const int32_t handle = OpenSampling(kRange);
 
     Event event{};
     ASSERT_EQ(Poll(handle, &event), 0);
@@ -156,9 +184,7 @@ TEST_F(PollTest, RangeEventWithNoZonesHoldsTheHeaderOnly) {
 
 TEST_F(PollTest, AlsEventSwapsTheLastTwoChannels) {
     sensor_doubles::SetAlsData(AlsSample());
-    int32_t handle = Open(kAls);
-    EXPECT_GT(handle, 0);
-    StartHeldSampling(handle, kAls);
+    const int32_t handle = OpenSampling(kAls);
 
     Event event = Sentinel();
     ASSERT_EQ(Poll(handle, &event), 0);
@@ -171,10 +197,7 @@ TEST_F(PollTest, AlsEventSwapsTheLastTwoChannels) {
 
 TEST_F(PollTest, EachHandleTakesASampleOnce) {
     sensor_doubles::SetRangeData(ExtremeFrame(1));
-    int32_t sampler = Open(kRange);
-    int32_t other = Open(kRange);
-    for (int32_t handle : {sampler, other}) EXPECT_GT(handle, 0);
-    StartHeldSampling(sampler, kRange);
+    const auto [sampler, other] = OpenSamplerAndIdle();
 
     Event first{};
     ASSERT_EQ(Poll(sampler, &first), 0);
@@ -207,32 +230,16 @@ TEST_F(PollTest, EachHandleTakesASampleOnce) {
 TEST_F(PollTest, NoSampleYetIsInvalidDataLoggedOnce) {
     int32_t handle = Open(kRange);
     EXPECT_GT(handle, 0);
-    Event event = Sentinel();
-    EXPECT_EQ(Poll(handle, &event), -61);
-    ExpectSentinel(event);
-    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
-
-    EXPECT_EQ(Poll(handle, &event), -61);
-    ExpectSentinel(event);
-    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
+    ExpectInvalidDataLoggedOnce(handle);
 }
 
 TEST_F(PollTest, InvalidSampleIsLoggedOnceAndLeavesTheEventAlone) {
     MultiRangingData frame = ExtremeFrame(2);
     frame.valid = 0;
     sensor_doubles::SetRangeData(frame);
-    int32_t handle = Open(kRange);
-    EXPECT_GT(handle, 0);
-    StartHeldSampling(handle, kRange);
+    const int32_t handle = OpenSampling(kRange);
     log_.Clear();
-
-    Event event = Sentinel();
-    EXPECT_EQ(Poll(handle, &event), -61);
-    ExpectSentinel(event);
-    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
-    EXPECT_EQ(Poll(handle, &event), -61);
-    ExpectSentinel(event);
-    EXPECT_EQ(log_.Count(kTag, ANDROID_LOG_WARN, kInvalidData), 1u);
+    ExpectInvalidDataLoggedOnce(handle);
 
     // An invalid ambient-light sample too.
     ALSResult als = AlsSample();
@@ -243,6 +250,7 @@ TEST_F(PollTest, InvalidSampleIsLoggedOnceAndLeavesTheEventAlone) {
     EXPECT_EQ(0, Enable(light, 1));
     ASSERT_TRUE(sensor_doubles::WaitForCalls(sensor_doubles::kAlsReadSingleShot, 2, kWait));
     // Every stored sample is invalid, so no poll ever succeeds.
+    Event event = Sentinel();
     EXPECT_EQ(Poll(light, &event), -61);
     ExpectSentinel(event);
 }
@@ -259,10 +267,7 @@ TEST_F(PollTest, UnknownHandleIsInvalidArgument) {
 
 TEST_F(PollTest, StoredSampleOutlivesSampling) {
     sensor_doubles::SetRangeData(ExtremeFrame(2));
-    int32_t sampler = Open(kRange);
-    int32_t late = Open(kRange);
-    for (int32_t handle : {sampler, late}) EXPECT_GT(handle, 0);
-    StartHeldSampling(sampler, kRange);
+    const auto [sampler, late] = OpenSamplerAndIdle();
     Event event{};
     ASSERT_EQ(Poll(sampler, &event), 0);
 

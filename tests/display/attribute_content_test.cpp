@@ -4,19 +4,25 @@
 #include <android/log.h>
 
 #include <cerrno>
+#include <string>
 
 #include "display_fixture.h"
 
 namespace vyr_test::display {
 namespace {
 
-using AttributeContentTest = DisplayTest;
-
 constexpr char kReadError[] = "vyrservice failed to read display state file: ";
 
-bool IsCount(const vyr_test::ModeBlockSnapshot& block, int32_t count) {
-    return block.enable_count == count;
-}
+class AttributeContentTest : public DisplayTest {
+  protected:
+    // Sets a lit `content` on the dark attribute and waits until the display has enabled the
+    // light mode; call it through ASSERT_NO_FATAL_FAILURE.
+    void LightTheAttribute(const std::string& content) {
+        fuse_->Set(content);
+        ASSERT_TRUE(WaitForEnableLine(content));
+        ASSERT_TRUE(WaitForEnableCount(1));
+    }
+};
 
 TEST_F(AttributeContentTest, ReadErrorWhileDarkLogsAndQueuesNothing) {
     MakeServiceOnFuse();
@@ -33,9 +39,7 @@ TEST_F(AttributeContentTest, ReadErrorWhileDarkLogsAndQueuesNothing) {
 
     // Had either error queued a disable, this first enable would not count 1.
     fuse_->FailReads(0);
-    fuse_->Set("On\n");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 1); }));
+    ASSERT_NO_FATAL_FAILURE(LightTheAttribute("On\n"));
     const int32_t display = DisplayHandle();
     EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, EnableWorkText(1, display, 1000, 1000), kWait));
     EXPECT_EQ(0u, WorkLogCount("DisableWork", display));
@@ -46,9 +50,7 @@ TEST_F(AttributeContentTest, ReadErrorWhileLitDisablesAsDark) {
     MakeServiceOnFuse();
     if (fuse_ == nullptr) return;
     ASSERT_TRUE(fuse_->WaitForOpens(1, kWait));
-    fuse_->Set("On\n");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 1); }));
+    ASSERT_NO_FATAL_FAILURE(LightTheAttribute("On\n"));
     const int32_t display = DisplayHandle();
 
     fuse_->FailReads(EIO);
@@ -70,16 +72,14 @@ TEST_F(AttributeContentTest, ReadErrorWhileLitDisablesAsDark) {
     ASSERT_TRUE(WaitForEnableLine("On\n", 2));
     ASSERT_TRUE(WaitForWorkLog("EnableWork", display, 2));
     EXPECT_EQ(1u, WorkLogCount("DisableWork", display));
-    EXPECT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 1); }));
+    EXPECT_TRUE(WaitForEnableCount(1));
 }
 
 TEST_F(AttributeContentTest, ContentIsJudgedAsReadWithoutANewline) {
     MakeServiceOnFuse();
     if (fuse_ == nullptr) return;
     ASSERT_TRUE(fuse_->WaitForOpens(1, kWait));
-    fuse_->Set("On");
-    ASSERT_TRUE(WaitForEnableLine("On"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, [](const auto& block) { return IsCount(block, 1); }));
+    ASSERT_NO_FATAL_FAILURE(LightTheAttribute("On"));
     const int32_t display = DisplayHandle();
     // Truly empty content (zero bytes read) is dark.
     fuse_->Set("");

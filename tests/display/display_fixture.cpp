@@ -164,6 +164,12 @@ bool DisplayTest::WaitForBlock(
         kWait);
 }
 
+bool DisplayTest::WaitForEnableCount(int32_t count) {
+    return WaitForBlock(kAlsBlock, [count](const vyr_test::ModeBlockSnapshot& block) {
+        return block.enable_count == count;
+    });
+}
+
 std::future<void> DisplayTest::StartDestruction() {
     return std::async(std::launch::async,
                       [service = std::move(service_)]() mutable { service.reset(); });

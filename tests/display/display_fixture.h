@@ -60,6 +60,8 @@ class DisplayTest : public vyr_test::ServiceFixture {
     // Waits until the light or range block satisfies `condition`.
     bool WaitForBlock(size_t index,
                       const std::function<bool(const vyr_test::ModeBlockSnapshot&)>& condition);
+    // Waits until the light block counts `count` enabled handles.
+    bool WaitForEnableCount(int32_t count);
     // Starts destroying the service on another thread.
     std::future<void> StartDestruction();
     // Notifies the display monitor's attribute again every 20 ms (waking the monitor without

@@ -17,18 +17,31 @@ using sensor_doubles::CountOf;
 using sensor_doubles::kAlsReadSingleShot;
 using sensor_doubles::WaitForCalls;
 
-using DisplayStateTest = DisplayTest;
-
-std::function<bool(const vyr_test::ModeBlockSnapshot&)> EnableCountIs(int32_t count) {
-    return [count](const vyr_test::ModeBlockSnapshot& block) { return block.enable_count == count; };
-}
+// Steps most tests share; call them through ASSERT_NO_FATAL_FAILURE so a failed wait ends the test.
+class DisplayStateTest : public DisplayTest {
+  protected:
+    // Builds the service and waits until its monitor watches the panel.
+    void WatchThePanel() {
+        MakeService();
+        ASSERT_TRUE(WaitForMonitorWatching(true));
+    }
+    // Shows a lit `state` on a dark panel and waits until the display has enabled the light mode.
+    void LightThePanel(const std::string& state = "On") {
+        Panel(state);
+        ASSERT_TRUE(WaitForEnableLine(state + "\n"));
+        ASSERT_TRUE(WaitForEnableCount(1));
+    }
+    // Shows "Off" on a lit panel and waits until nothing holds the light mode any more.
+    void DarkenThePanel() {
+        Panel("Off");
+        ASSERT_TRUE(WaitForDisableLine("Off\n"));
+        ASSERT_TRUE(WaitForEnableCount(0));
+    }
+};
 
 TEST_F(DisplayStateTest, OnWithNewlineEnablesTheLightModeForTheDisplay) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
-    Panel("On");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
+    ASSERT_NO_FATAL_FAILURE(LightThePanel());
     const int32_t display = DisplayHandle();
     EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, EnableWorkText(1, display, 1000, 1000), kWait));
     const auto block = vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock);
@@ -41,19 +54,14 @@ TEST_F(DisplayStateTest, OnWithNewlineEnablesTheLightModeForTheDisplay) {
     EXPECT_EQ((std::vector<int64_t>{1, 30}), read.args);
     EXPECT_TRUE(read.als_enabled);
 
-    Panel("Off");
-    ASSERT_TRUE(WaitForDisableLine("Off\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
+    ASSERT_NO_FATAL_FAILURE(DarkenThePanel());
     EXPECT_TRUE(log_.WaitFor(kTag, ANDROID_LOG_INFO, DisableWorkText(0, display, 1000), kWait));
     EXPECT_FALSE(vyr_test::ServicePeer::SnapshotModeBlock(*service_, kAlsBlock).running);
 }
 
 TEST_F(DisplayStateTest, DumpShowsTheLastPanelStateAndItsChanges) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
-    Panel("On");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
+    ASSERT_NO_FATAL_FAILURE(LightThePanel());
     std::string text = vyr_test::DumpOf(service_->asBinder().get()).text;
     EXPECT_NE(text.find("  monitor: watching " + std::string(kStatePath) + "\n"), std::string::npos)
         << text;
@@ -66,23 +74,17 @@ TEST_F(DisplayStateTest, DumpShowsTheLastPanelStateAndItsChanges) {
     text = vyr_test::DumpOf(service_->asBinder().get()).text;
     EXPECT_NE(text.find("  last_state: Off\n"), std::string::npos) << text;
     EXPECT_NE(text.find("event: display dark: Off\n"), std::string::npos) << text;
-    EXPECT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
+    EXPECT_TRUE(WaitForEnableCount(0));
 }
 
 TEST_F(DisplayStateTest, HbmIsLit) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
-    Panel("HBM");
-    ASSERT_TRUE(WaitForEnableLine("HBM\n"));
-    EXPECT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
-    Panel("Off");
-    ASSERT_TRUE(WaitForDisableLine("Off\n"));
-    EXPECT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
+    ASSERT_NO_FATAL_FAILURE(LightThePanel("HBM"));
+    ASSERT_NO_FATAL_FAILURE(DarkenThePanel());
 }
 
 TEST_F(DisplayStateTest, OffLowerCaseOnAndEmptyAreDark) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
     int32_t display = 0;
     // Each dark content is shown from a lit panel, so its disable line proves how it was judged.
     for (const std::string dark : {"Off", "on", ""}) {
@@ -91,7 +93,7 @@ TEST_F(DisplayStateTest, OffLowerCaseOnAndEmptyAreDark) {
         Panel("On");
         ASSERT_TRUE(WaitForEnableLine("On\n", enabled + 1));
         if (display == 0) {
-            ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+            ASSERT_TRUE(WaitForEnableCount(1));
             display = DisplayHandle();
         }
         Panel(dark);
@@ -107,11 +109,8 @@ TEST_F(DisplayStateTest, OffLowerCaseOnAndEmptyAreDark) {
 }
 
 TEST_F(DisplayStateTest, RepeatedLitNotificationsQueueOneEnable) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
-    Panel("On");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
+    ASSERT_NO_FATAL_FAILURE(LightThePanel());
     const int32_t display = DisplayHandle();
     // Contents of different lengths show, through the monitor's read position, that each
     // notification was read on its own.
@@ -131,30 +130,22 @@ TEST_F(DisplayStateTest, RepeatedLitNotificationsQueueOneEnable) {
 }
 
 TEST_F(DisplayStateTest, RepeatedDarkNotificationsQueueNothing) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
     for (const std::string dark : {"Off", "Offline", "off"}) {
         Panel(dark);
         ASSERT_TRUE(WaitForMonitorRead(dark.size() + 1)) << dark;
     }
     // The first transition afterwards is logged as the first one of any kind.
-    Panel("On");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+    ASSERT_NO_FATAL_FAILURE(LightThePanel());
     const int32_t display = DisplayHandle();
     EXPECT_EQ(0u, WorkLogCount("DisableWork", display));
     EXPECT_EQ(0u, DisableLines("Off\n") + DisableLines("Offline\n") + DisableLines("off\n"));
-    Panel("Off");
-    ASSERT_TRUE(WaitForDisableLine("Off\n"));
-    EXPECT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(0)));
+    ASSERT_NO_FATAL_FAILURE(DarkenThePanel());
 }
 
 TEST_F(DisplayStateTest, OnlyTheFirstFortyNineBytesAreJudged) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
-    Panel("On");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
+    ASSERT_NO_FATAL_FAILURE(LightThePanel());
     const int32_t display = DisplayHandle();
     // 49 bytes, then "On": 52 bytes with the newline; "On" lies beyond the judged text.
     Panel(std::string(49, 'x') + "On");
@@ -175,11 +166,8 @@ TEST_F(DisplayStateTest, OnlyTheFirstFortyNineBytesAreJudged) {
 }
 
 TEST_F(DisplayStateTest, DisplayAndClientShareTheLightMode) {
-    MakeService();
-    ASSERT_TRUE(WaitForMonitorWatching(true));
-    Panel("On");
-    ASSERT_TRUE(WaitForEnableLine("On\n"));
-    ASSERT_TRUE(WaitForBlock(kAlsBlock, EnableCountIs(1)));
+    ASSERT_NO_FATAL_FAILURE(WatchThePanel());
+    ASSERT_NO_FATAL_FAILURE(LightThePanel());
     const int32_t display = DisplayHandle();
 
     int32_t client = 0;

@@ -6,6 +6,8 @@
 #include <android/log.h>
 #include <gtest/gtest.h>
 
+#include <string>
+
 #include "log_capture.h"
 #include "temp_dir.h"
 
@@ -16,14 +18,21 @@ using sensors_sim::LoadScenario;
 using sensors_sim::ParseScenarioFile;
 using sensors_sim::Scenario;
 
+// The options other than a recording to replay, as "name=value" in the file's spelling, so that
+// one comparison shows every option that differs.
+std::string Options(const Scenario& s) {
+    return "als.create_fails=" + std::to_string(s.als_create_fails) +
+           " range.create_fails=" + std::to_string(s.range_create_fails) +
+           " range.init_fails=" + std::to_string(s.range_init_fails) +
+           " invalid_every=" + std::to_string(s.invalid_every) +
+           " extra_latency_ms=" + std::to_string(s.extra_latency_ms) +
+           " zone_count=" + std::to_string(s.zone_count) + " seed=" + std::to_string(s.seed);
+}
+
 void ExpectDefaults(const Scenario& s) {
-    EXPECT_FALSE(s.als_create_fails);
-    EXPECT_FALSE(s.range_create_fails);
-    EXPECT_FALSE(s.range_init_fails);
-    EXPECT_EQ(s.invalid_every, 0);
-    EXPECT_EQ(s.extra_latency_ms, 0);
-    EXPECT_EQ(s.zone_count, 4);
-    EXPECT_EQ(s.seed, 1u);
+    EXPECT_EQ(Options(s),
+              "als.create_fails=0 range.create_fails=0 range.init_fails=0 invalid_every=0 "
+              "extra_latency_ms=0 zone_count=4 seed=1");
 }
 
 TEST(ScenarioTest, UnsetVariableGivesDefaults) {
@@ -44,13 +53,9 @@ TEST(ScenarioTest, EveryOptionIsRead) {
     setenv(sensors_sim::kScenarioVariable, path.c_str(), 1);
     const Scenario s = LoadScenario();
     unsetenv(sensors_sim::kScenarioVariable);
-    EXPECT_TRUE(s.als_create_fails);
-    EXPECT_TRUE(s.range_create_fails);
-    EXPECT_TRUE(s.range_init_fails);
-    EXPECT_EQ(s.invalid_every, 5);
-    EXPECT_EQ(s.extra_latency_ms, 250);
-    EXPECT_EQ(s.zone_count, 2);
-    EXPECT_EQ(s.seed, 123456789012u);
+    EXPECT_EQ(Options(s),
+              "als.create_fails=1 range.create_fails=1 range.init_fails=1 invalid_every=5 "
+              "extra_latency_ms=250 zone_count=2 seed=123456789012");
 }
 
 TEST(ScenarioTest, CommentsBlankLinesAndWhitespaceAreAccepted) {

@@ -293,15 +293,12 @@ TEST_F(ShellTest, PrintsOneResultLinePerCommand) {
     std::vector<std::string> lines =
         RunLines({"open 3", "enable 42 100", "poll 42", "poll 7", "lowpower 42 1", "disable 42",
                   "torch 257", "close 42"});
-    ASSERT_EQ(lines.size(), 8u);
-    EXPECT_EQ(lines[0], "open 3 -> 42");
-    EXPECT_EQ(lines[1], "enable 42 100 -> 0");
-    EXPECT_EQ(lines[2], "poll 42 -> 0 status=171 timestamp=123 value0=0.5 value1=-2 data=[1,2.25]");
-    EXPECT_EQ(lines[3], "poll 7 -> -61 (no new sample)");
-    EXPECT_EQ(lines[4], "lowpower 42 1 -> -22 (invalid argument or handle)");
-    EXPECT_EQ(lines[5], "disable 42 -> ok");
-    EXPECT_EQ(lines[6], "torch 257 -> ok");
-    EXPECT_EQ(lines[7], "close 42 -> ok");
+    EXPECT_EQ(lines, (std::vector<std::string>{
+                         "open 3 -> 42", "enable 42 100 -> 0",
+                         "poll 42 -> 0 status=171 timestamp=123 value0=0.5 value1=-2 data=[1,2.25]",
+                         "poll 7 -> -61 (no new sample)",
+                         "lowpower 42 1 -> -22 (invalid argument or handle)", "disable 42 -> ok",
+                         "torch 257 -> ok", "close 42 -> ok"}));
     EXPECT_TRUE(err_lines_.empty());
 }
 
@@ -309,29 +306,29 @@ TEST_F(ShellTest, BadInputGivesAnErrorLineAndGoesOn) {
     std::vector<std::string> lines =
         RunLines({"frobnicate", "enable 42", "enable x 100", "open sonar", "lowpower 42 2", "",
                   "# comment", "open 2", "quit", "open 3"});
-    ASSERT_EQ(lines.size(), 6u);
-    EXPECT_EQ(lines[0], "error: unknown command 'frobnicate' (type 'help' for the list)");
-    EXPECT_EQ(lines[1], "error: wrong number of arguments; usage: enable HANDLE PERIOD_MS");
-    EXPECT_EQ(lines[2], "error: 'x' is not a 32-bit whole number; usage: enable HANDLE PERIOD_MS");
-    EXPECT_EQ(lines[3], "error: 'sonar' is not a mode (1 or als, 3 or range)");
-    EXPECT_EQ(lines[4], "error: lowpower takes 0 or 1, not 2");
-    EXPECT_EQ(lines[5], "open 2 -> -22 (invalid argument or handle)");
+    EXPECT_EQ(lines, (std::vector<std::string>{
+                         "error: unknown command 'frobnicate' (type 'help' for the list)",
+                         "error: wrong number of arguments; usage: enable HANDLE PERIOD_MS",
+                         "error: 'x' is not a 32-bit whole number; usage: enable HANDLE PERIOD_MS",
+                         "error: 'sonar' is not a mode (1 or als, 3 or range)",
+                         "error: lowpower takes 0 or 1, not 2",
+                         "open 2 -> -22 (invalid argument or handle)"}));
     EXPECT_EQ(service_->calls, std::vector<std::string>{"Open 2"});
 }
 
 TEST_F(ShellTest, CallbackEventsArePrintedAsEventLines) {
     std::vector<std::string> lines = RunLines({"callback 42"});
-    ASSERT_EQ(lines.size(), 2u);
-    EXPECT_EQ(lines[0], "event 42 status=0 timestamp=5 value0=0 value1=0 data=[1.5]");
-    EXPECT_EQ(lines[1], "callback 42 -> 0");
+    EXPECT_EQ(lines, (std::vector<std::string>{
+                         "event 42 status=0 timestamp=5 value0=0 value1=0 data=[1.5]",
+                         "callback 42 -> 0"}));
 }
 
 TEST_F(ShellTest, ConfigurePassesTheValuesOn) {
     std::vector<std::string> lines =
         RunLines({"configure 42 1 2 3 4 1 0 2 5 6 7 8", "configure 42 1 2"});
-    ASSERT_EQ(lines.size(), 2u);
-    EXPECT_EQ(lines[0], "configure 42 1 2 3 4 1 0 2 5 6 7 8 -> 0");
-    EXPECT_EQ(lines[1], "configure 42 1 2 -> -22 (invalid argument or handle)");
+    EXPECT_EQ(lines,
+              (std::vector<std::string>{"configure 42 1 2 3 4 1 0 2 5 6 7 8 -> 0",
+                                        "configure 42 1 2 -> -22 (invalid argument or handle)"}));
 }
 
 TEST_F(ShellTest, HandlesLeftOpenAreDisabledAndClosed) {
