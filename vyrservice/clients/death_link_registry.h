@@ -9,6 +9,7 @@
 #include <memory>
 #include <mutex>
 #include <unordered_map>
+#include <utility>
 
 #include "client_entry.h"
 
@@ -17,24 +18,25 @@ namespace vyr {
 namespace binder {
 
 // The death links of the clients' callbacks. A link's cookie (the callback's binder and the
-// service) must stay valid for as long as the runtime may deliver a notice with it, which can be
-// after its entry has left the table: the registry owns every cookie and recipient, and frees
-// one only after the runtime has reported that no notice can come any more (the link was
-// removed, or its notice delivered), never inside that report.
+// service) must stay valid for as long as the runtime may use it: until it reports the link
+// unlinked, which can be after its entry has left the table, and after the recipient was deleted
+// (binder_ibinder.h: the cookie is cleaned up in onUnlinked, not when the delete returns). The
+// registry owns every cookie and recipient and frees a link only once it was reported unlinked,
+// never inside that report while the registry lives; links still linked when it goes are freed by
+// their own report.
 class DeathLinkRegistry {
   public:
     // `on_died` gets the cookie (a `const DeathCookie*`) of the link whose binder died; the
     // cookie names `service`.
     DeathLinkRegistry(VYRService* service, AIBinder_DeathRecipient_onBinderDied on_died);
-    // Deleting a recipient unlinks what is still linked; the runtime reports each such unlink
-    // while the link is being freed, its cookie still valid.
+    // Deletes every recipient, which unlinks what is still linked.
     ~DeathLinkRegistry();
     DeathLinkRegistry(const DeathLinkRegistry&) = delete;
     DeathLinkRegistry& operator=(const DeathLinkRegistry&) = delete;
 
     // Links the entry's `callback_binder` to death and records the link in the entry. No link is
     // recorded when none could be made (a binder of this process, or one already dead).
-    void Link(ClientEntry* entry) EXCLUDES(mutex_);
+    void Link(ClientEntry* entry);
     // Removes the entry's link, so that its cookie can be given back. A notice already on its way
     // is delivered anyway; the runtime reports the unlink after it.
     static void Unlink(ClientEntry* entry);
@@ -43,20 +45,36 @@ class DeathLinkRegistry {
     // the one that releases another handle whose callback is the same binder.
     static void LetGo(ClientEntry* entry);
     // Frees the links that the runtime has let go of.
-    void Sweep() EXCLUDES(mutex_);
+    void Sweep();
     // Links not yet freed.
-    size_t Size() EXCLUDES(mutex_);
+    size_t Size();
 
   private:
-    // What the runtime hands back: the service's cookie, and the registry for the unlink report.
+    struct DeathLink;
+    // The links, shared with their cookies: it outlives the registry while a link may still be
+    // reported.
+    struct Links {
+        std::mutex mutex;
+        std::unordered_map<const DeathCookie*, std::unique_ptr<DeathLink>> map GUARDED_BY(mutex);
+        // The registry is gone: a link is freed by its own unlink report.
+        bool closed GUARDED_BY(mutex) = false;
+    };
+    // What the runtime hands back: the service's cookie, and the links for the unlink report.
     struct Cookie : DeathCookie {
-        Cookie(AIBinder* binder, VYRService* service, DeathLinkRegistry* owner)
-            : DeathCookie(binder, service), registry(owner) {}
-        DeathLinkRegistry* const registry;
+        Cookie(AIBinder* binder, VYRService* service, std::shared_ptr<Links> owner)
+            : DeathCookie(binder, service), links(std::move(owner)) {}
+        const std::shared_ptr<Links> links;
     };
     struct DeathLink {
+        DeathLink(AIBinder* binder, VYRService* service, std::shared_ptr<Links> links,
+                  AIBinder_DeathRecipient_onBinderDied on_died);
+        // Deletes the recipient unless it was handed over to be deleted already.
+        ~DeathLink();
+        DeathLink(const DeathLink&) = delete;
+        DeathLink& operator=(const DeathLink&) = delete;
+
         Cookie cookie;
-        std::unique_ptr<AIBinder_DeathRecipient, void (*)(AIBinder_DeathRecipient*)> recipient;
+        AIBinder_DeathRecipient* recipient;
         bool unlinked = false;
     };
 
@@ -65,8 +83,7 @@ class DeathLinkRegistry {
     VYRService* const service_;
     const AIBinder_DeathRecipient_onBinderDied on_died_;
     // Not the API lock: the runtime reports an unlinked link also from inside a method's unlink.
-    std::mutex mutex_;
-    std::unordered_map<const DeathCookie*, std::unique_ptr<DeathLink>> links_ GUARDED_BY(mutex_);
+    const std::shared_ptr<Links> links_ = std::make_shared<Links>();
 };
 
 }  // namespace binder
