@@ -14,7 +14,8 @@ import android.vyr.IEventCallback;
  * Result codes: each method's result code is its return value, so the generated C++ carries it
  * as the last out-parameter; the binder status itself is always OK, also when the call failed.
  * Codes are 0, a handle, -1 or a negated errno: -17 EEXIST, -19 ENODEV, -22 EINVAL, -38 ENOSYS,
- * -61 ENODATA, and in version 2 -95 EOPNOTSUPP. Methods without a result report nothing.
+ * -61 ENODATA, in version 2 -95 EOPNOTSUPP, and in version 3 -12 ENOMEM. Methods without a
+ * result report nothing.
  *
  * Threading: every call runs on a binder thread of the service, and all of them one at a time
  * under one lock; a call that waits more than 10 s for it ends the service. Periods are
@@ -80,4 +81,17 @@ interface IVYRService {
     // client's process ends it unanswered. 0, -38 for an unknown handle, -22 for a handle not
     // enabled on sample with a callback, -95 for a version 1 callback.
     int Flush(int handle);
+    // Version 3. Enables a handle like Enable (at most every `period` ms, below 1: 1000 ms; a
+    // callback set before is served as Enable serves it) and hands over, in `ring`, a read-only
+    // descriptor of the handle's mode's sample ring: shared memory that the service writes each
+    // valid sample into as it stores it, for as long as at least one handle is enabled this way,
+    // so that a reader matches samples to camera frames by their boottime with no call per
+    // sample. Layout, sequence numbers and the reading protocol: vyr/sample_ring_layout.h (ring
+    // layout version 1). Every client's ring of one mode is the same memory. The handle counts
+    // among the ten clients and is released as any other: by Disable, Close or its process's
+    // death; the mapping stays readable afterwards, but the ring is no longer written for it.
+    // 0 with `ring` set; -38 for an unknown handle and -17 for a handle already enabled (as
+    // Enable); -19 when the handle's mode has no sensor; -12 ENOMEM when the ring's memory cannot
+    // be made. `ring` is null whenever the result is not 0.
+    int EnableRing(int handle, int period, out @nullable ParcelFileDescriptor ring);
 }

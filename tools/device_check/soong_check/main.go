@@ -82,7 +82,7 @@ cc_library {
 	stl: "none",
 }
 cc_library {
-	name: "android.vyr-V2-ndk",
+	name: "android.vyr-V3-ndk",
 	vendor_available: true,
 	nocrt: true,
 	system_shared_libs: [],

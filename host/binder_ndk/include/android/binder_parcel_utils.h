@@ -177,6 +177,37 @@ static inline binder_status_t AParcel_readNullableStrongBinder(const AParcel* pa
 
 // ---- Parcelables (types with readFromParcel/writeToParcel) ----
 
+// A ParcelFileDescriptor as the generated code passes it: the parcel keeps a duplicate, and a
+// read hands the caller a duplicate of its own. A required one may not be null.
+static inline binder_status_t AParcel_writeRequiredParcelFileDescriptor(
+        AParcel* parcel, const ScopedFileDescriptor& fd) {
+    if (fd.get() < 0) return STATUS_UNEXPECTED_NULL;
+    return AParcel_writeParcelFileDescriptor(parcel, fd.get());
+}
+
+static inline binder_status_t AParcel_readRequiredParcelFileDescriptor(const AParcel* parcel,
+                                                                       ScopedFileDescriptor* fd) {
+    int readFd;
+    binder_status_t status = AParcel_readParcelFileDescriptor(parcel, &readFd);
+    if (status != STATUS_OK) return status;
+    if (readFd < 0) return STATUS_UNEXPECTED_NULL;
+    fd->set(readFd);
+    return STATUS_OK;
+}
+
+static inline binder_status_t AParcel_writeNullableParcelFileDescriptor(
+        AParcel* parcel, const ScopedFileDescriptor& fd) {
+    return AParcel_writeParcelFileDescriptor(parcel, fd.get());
+}
+
+static inline binder_status_t AParcel_readNullableParcelFileDescriptor(const AParcel* parcel,
+                                                                       ScopedFileDescriptor* fd) {
+    int readFd;
+    binder_status_t status = AParcel_readParcelFileDescriptor(parcel, &readFd);
+    if (status == STATUS_OK) fd->set(readFd);
+    return status;
+}
+
 template <typename P>
 static inline binder_status_t AParcel_writeParcelable(AParcel* parcel, const P& p) {
     return p.writeToParcel(parcel);

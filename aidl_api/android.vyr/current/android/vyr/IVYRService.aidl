@@ -29,4 +29,5 @@ interface IVYRService {
   void SetTorchLightState(int state);
   int EnableOnSample(int handle, int period, int maxReportLatency);
   int Flush(int handle);
+  int EnableRing(int handle, int period, out @nullable ParcelFileDescriptor ring);
 }
