@@ -90,6 +90,9 @@ struct ClientEntry {
         // The samples on their way to the thread of a client enabled on sample with a callback;
         // null otherwise.
         std::shared_ptr<SampleQueue> sample_queue;
+        // Set by EnableRing (version 3): counted among its mode's ring clients until Disable,
+        // Close or its death.
+        bool ring = false;
     };
     Delivery delivery;
 

@@ -17,6 +17,7 @@
 
 #include "ambient_light_sensor.h"
 #include "sample_queue.h"
+#include "sample_ring.h"
 #include "ubk/range_sensor.h"
 
 namespace android {
@@ -53,6 +54,10 @@ struct ServiceModeParams {
         // The queues of the clients enabled on sample with a callback, offered each sample as it
         // is stored.
         std::vector<std::shared_ptr<SampleQueue>> sample_queues;
+        // Version 3: the mode's sample ring, made by the first EnableRing and kept, so that every
+        // client's mapping stays the same memory; written while `ring_clients` are enabled on it.
+        std::shared_ptr<SampleRing> ring;
+        int32_t ring_clients = 0;
     };
     SampleFeed feed GUARDED_BY(data_mutex);
 

@@ -202,6 +202,8 @@ void VYRService::CloseInternal(int32_t handle, DeferredJoin* after_unlock) {
     clients_.erase(it);
     --num_clients_;
     dump_state_.RecordEvent("close handle " + std::to_string(handle));
+    // Closed while enabled (Disable is the client's to call first): its ring is written no more.
+    LeaveRingLocked(*entry);
     DeathLinkRegistry::Unlink(entry.get());
     client_processes_.Forget(entry->users, clients_);
     death_links_.Sweep();
@@ -288,6 +290,74 @@ ndk::ScopedAStatus VYRService::EnableOnSample(int32_t handle, int32_t period,
     return Ok();
 }
 
+ndk::ScopedAStatus VYRService::EnableRing(int32_t handle, int32_t period,
+                                          ndk::ScopedFileDescriptor* ring, int32_t* result) {
+    LOCK_API();
+    std::shared_ptr<ClientEntry> target = EnableTargetLocked(__func__, handle, result);
+    if (target == nullptr) return Ok();
+    ClientEntry& entry = *target;
+    if ((entry.mode == kAlsMode ? static_cast<void*>(als_sensor_)
+                                : static_cast<void*>(range_sensor_)) == nullptr) {
+        ALOGE("%s handle %d: mode %d has no sensor", __func__, handle, entry.mode);
+        *result = -ENODEV;
+        return Ok();
+    }
+    ServiceModeParams& params = ParamsForMode(entry.mode);
+    ndk::ScopedFileDescriptor reader = RingReaderLocked(params);
+    if (reader.get() < 0) {
+        *result = -ENOMEM;
+        return Ok();
+    }
+    ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
+    entry.period = period >= 1 ? period : kDefaultPeriodMs;
+    entry.delivery.on_sample = false;
+    entry.delivery.max_report_latency = 0;
+    entry.delivery.ring = true;
+    {
+        std::lock_guard<std::mutex> lock(params.data_mutex);
+        ++params.feed.ring_clients;
+    }
+    StartClientLocked(handle, target);
+    *ring = std::move(reader);
+    *result = 0;
+    return Ok();
+}
+
+ndk::ScopedFileDescriptor VYRService::RingReaderLocked(ServiceModeParams& params) {
+    std::shared_ptr<SampleRing> ring;
+    {
+        std::lock_guard<std::mutex> lock(params.data_mutex);
+        ring = params.feed.ring;
+    }
+    if (ring == nullptr) {
+        // Made outside data_mutex, which the processing loop takes for every sample; the API
+        // lock keeps a second EnableRing from making another.
+        std::string error;
+        ring = SampleRing::Create(params.mode, VYR_RING_CAPACITY, &error);
+        if (ring == nullptr) {
+            ALOGE("EnableRing: cannot make the ring of mode %d: %s", params.mode.load(),
+                  error.c_str());
+            return ndk::ScopedFileDescriptor();
+        }
+        std::lock_guard<std::mutex> lock(params.data_mutex);
+        params.feed.ring = ring;
+    }
+    ndk::ScopedFileDescriptor reader = ring->ReaderFd();
+    if (reader.get() < 0) {
+        ALOGE("EnableRing: cannot pass on the ring of mode %d: %s", params.mode.load(),
+              strerror(errno));
+    }
+    return reader;
+}
+
+void VYRService::LeaveRingLocked(ClientEntry& entry) {
+    if (!entry.delivery.ring) return;
+    entry.delivery.ring = false;
+    ServiceModeParams& params = ParamsForMode(entry.mode);
+    std::lock_guard<std::mutex> lock(params.data_mutex);
+    --params.feed.ring_clients;
+}
+
 void VYRService::LearnCallbackVersion(int32_t handle) {
     std::shared_ptr<IEventCallback> callback;
     {
@@ -366,6 +436,7 @@ void VYRService::DisableInternal(int32_t handle, bool client_died, DeferredJoin*
         return;
     }
     ALOGI("%s handle %d, mode %d", __func__, handle, entry.mode);
+    LeaveRingLocked(entry);
     if (client_died) {
         entry.StopNotify();
     } else if (entry.delivery.on_sample) {

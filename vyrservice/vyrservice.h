@@ -115,6 +115,8 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     ndk::ScopedAStatus EnableOnSample(int32_t handle, int32_t period, int32_t max_report_latency,
                                       int32_t* result) override;
     ndk::ScopedAStatus Flush(int32_t handle, int32_t* result) override;
+    ndk::ScopedAStatus EnableRing(int32_t handle, int32_t period, ndk::ScopedFileDescriptor* ring,
+                                  int32_t* result) override;
 
     // `dumpsys vyrservice`: sensors, mode blocks, clients, queues, display, APEX and recent
     // events, as text or (argument "--json") one JSON object. Waits at most 1 s for any lock and
@@ -167,6 +169,12 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // with `*result` set for an unknown handle (-38) or a client already enabled (-17).
     std::shared_ptr<ClientEntry> EnableTargetLocked(const char* method, int32_t handle,
                                                     int32_t* result) REQUIRES(api_lock_);
+    // A read-only descriptor of the ring of `params`' mode, the ring made first if need be; -1
+    // (logged) when it cannot be.
+    ndk::ScopedFileDescriptor RingReaderLocked(ServiceModeParams& params) REQUIRES(api_lock_);
+    // Takes the client off its mode's ring clients, if it is one: its ring is no longer written
+    // for it.
+    void LeaveRingLocked(ClientEntry& entry) REQUIRES(api_lock_);
     // What Enable and EnableOnSample share once the entry is set up: the delivery thread, the
     // work item and the dump's record.
     void StartClientLocked(int32_t handle, const std::shared_ptr<ClientEntry>& entry)

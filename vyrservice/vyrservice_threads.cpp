@@ -22,6 +22,7 @@
 #include <optional>
 
 #include "display_state.h"
+#include "ring_feed.h"
 #include "sensor_modes.h"
 #include "vyrservice.h"
 
@@ -203,6 +204,7 @@ void VYRService::ProcessLoop(ServiceModeParams* params) {
             }
             params->polled_handles.clear();
             EventDelivery::SampleStored(*params);
+            FeedRing(*params);
             ++params->dump.samples;
             if ((mode == kAlsMode ? reading.valid : data.valid) == 0)
                 ++params->dump.invalid_samples;
