@@ -302,8 +302,7 @@ ndk::ScopedAStatus VYRService::EnableRing(int32_t handle, int32_t period,
         *result = -ENODEV;
         return Ok();
     }
-    ServiceModeParams& params = ParamsForMode(entry.mode);
-    ndk::ScopedFileDescriptor reader = RingReaderLocked(params);
+    ndk::ScopedFileDescriptor reader = RingReaderLocked(entry.mode);
     if (reader.get() < 0) {
         *result = -ENOMEM;
         return Ok();
@@ -313,6 +312,7 @@ ndk::ScopedAStatus VYRService::EnableRing(int32_t handle, int32_t period,
     entry.delivery.on_sample = false;
     entry.delivery.max_report_latency = 0;
     entry.delivery.ring = true;
+    ServiceModeParams& params = ParamsForMode(entry.mode);
     {
         std::lock_guard<std::mutex> lock(params.data_mutex);
         ++params.feed.ring_clients;
@@ -323,7 +323,8 @@ ndk::ScopedAStatus VYRService::EnableRing(int32_t handle, int32_t period,
     return Ok();
 }
 
-ndk::ScopedFileDescriptor VYRService::RingReaderLocked(ServiceModeParams& params) {
+ndk::ScopedFileDescriptor VYRService::RingReaderLocked(int32_t mode) {
+    ServiceModeParams& params = ParamsForMode(mode);
     std::shared_ptr<SampleRing> ring;
     {
         std::lock_guard<std::mutex> lock(params.data_mutex);
@@ -333,10 +334,9 @@ ndk::ScopedFileDescriptor VYRService::RingReaderLocked(ServiceModeParams& params
         // Made outside data_mutex, which the processing loop takes for every sample; the API
         // lock keeps a second EnableRing from making another.
         std::string error;
-        ring = SampleRing::Create(params.mode, VYR_RING_CAPACITY, &error);
+        ring = SampleRing::Create(mode, VYR_RING_CAPACITY, &error);
         if (ring == nullptr) {
-            ALOGE("EnableRing: cannot make the ring of mode %d: %s", params.mode.load(),
-                  error.c_str());
+            ALOGE("EnableRing: cannot make the ring of mode %d: %s", mode, error.c_str());
             return ndk::ScopedFileDescriptor();
         }
         std::lock_guard<std::mutex> lock(params.data_mutex);
@@ -344,8 +344,7 @@ ndk::ScopedFileDescriptor VYRService::RingReaderLocked(ServiceModeParams& params
     }
     ndk::ScopedFileDescriptor reader = ring->ReaderFd();
     if (reader.get() < 0) {
-        ALOGE("EnableRing: cannot pass on the ring of mode %d: %s", params.mode.load(),
-              strerror(errno));
+        ALOGE("EnableRing: cannot pass on the ring of mode %d: %s", mode, strerror(errno));
     }
     return reader;
 }

@@ -169,9 +169,9 @@ class VYRService : public aidl::android::vyr::BnVYRService {
     // with `*result` set for an unknown handle (-38) or a client already enabled (-17).
     std::shared_ptr<ClientEntry> EnableTargetLocked(const char* method, int32_t handle,
                                                     int32_t* result) REQUIRES(api_lock_);
-    // A read-only descriptor of the ring of `params`' mode, the ring made first if need be; -1
-    // (logged) when it cannot be.
-    ndk::ScopedFileDescriptor RingReaderLocked(ServiceModeParams& params) REQUIRES(api_lock_);
+    // A read-only descriptor of the ring of `mode`, the ring made first if need be; -1 (logged)
+    // when it cannot be.
+    ndk::ScopedFileDescriptor RingReaderLocked(int32_t mode) REQUIRES(api_lock_);
     // Takes the client off its mode's ring clients, if it is one: its ring is no longer written
     // for it.
     void LeaveRingLocked(ClientEntry& entry) REQUIRES(api_lock_);
