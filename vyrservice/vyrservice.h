@@ -76,6 +76,9 @@ namespace binder {
 //                       |   .cpp              | HandleClientProcess-        |
 //                       |                     | Exit)                       |
 //
+// The processing loop also writes its mode's sample ring (version 3) under data_mutex; it wakes
+// the ring's readers but never waits for one, nor takes anything of theirs.
+//
 // Only the binder pool and the process watcher take api_lock_, so a thread joined under it never
 // waits for it, but through a client's nested call (below). A helper that must be called with
 // api_lock_ held ends in "Locked", except CloseInternal and DisableInternal, whose names are

@@ -17,6 +17,7 @@ namespace {
 using android::vyr::binder::ClientEntry;
 using android::vyr::binder::DumpValue;
 using android::vyr::binder::kClientEnabled;
+using android::vyr::binder::SampleRing;
 using android::vyr::binder::ServiceDumpState;
 using android::vyr::binder::ServiceModeParams;
 using android::vyr::binder::WorkItem;
@@ -97,6 +98,26 @@ TEST(ServiceDumpStateTest, AModeBlockNamesTheDisplayHandleAndCountsSamples) {
     EXPECT_EQ(block["samples"], 5);
     EXPECT_EQ(block["invalid_samples"], 1);
     EXPECT_TRUE(block["last_sample_age_ms"].is_null()) << "nothing stored yet";
+    EXPECT_EQ(block["ring_clients"], 0);
+    EXPECT_TRUE(block["ring_last_seq"].is_null()) << "no ring made yet";
+}
+
+TEST(ServiceDumpStateTest, AModeBlockShowsItsRingsClientsAndLastRecord) {
+    ServiceModeParams params;
+    params.mode = 3;
+    std::string error;
+    std::shared_ptr<SampleRing> ring = SampleRing::Create(3, 8, &error);
+    ASSERT_NE(ring, nullptr) << error;
+    ring->Write(aidl::android::vyr::Event{});
+    ring->Write(aidl::android::vyr::Event{});
+    {
+        std::lock_guard<std::mutex> lock(params.data_mutex);
+        params.feed.ring = ring;
+        params.feed.ring_clients = 2;
+    }
+    json block = Json(ServiceDumpState::ModeBlock(params, 1, /*display_handle=*/-7));
+    EXPECT_EQ(block["ring_clients"], 2);
+    EXPECT_EQ(block["ring_last_seq"], 2);
 }
 
 TEST(ServiceDumpStateTest, ClientsAreListedByHandleWithTheirUsersAndCounters) {
@@ -110,6 +131,7 @@ TEST(ServiceDumpStateTest, ClientsAreListedByHandleWithTheirUsersAndCounters) {
     pushed->state = kClientEnabled;
     pushed->users.unwatched = true;
     pushed->delivery.on_sample = true;
+    pushed->delivery.ring = true;
     pushed->counters.events_delivered = 3;
     *pushed->counters.samples_dropped = 2;
     clients.emplace(20, polled);
@@ -124,6 +146,8 @@ TEST(ServiceDumpStateTest, ClientsAreListedByHandleWithTheirUsersAndCounters) {
     EXPECT_EQ(shown[0]["on_sample"], true);
     EXPECT_EQ(shown[0]["events_delivered"], 3);
     EXPECT_EQ(shown[0]["samples_dropped"], 2);
+    EXPECT_EQ(shown[0]["ring"], true);
+    EXPECT_EQ(shown[1]["ring"], false);
     EXPECT_EQ(shown[1]["handle"], 20);
     EXPECT_EQ(shown[1]["mode"], 3);
     EXPECT_EQ(shown[1]["state"], "disabled");

@@ -104,6 +104,13 @@ DumpValue ServiceDumpState::ModeBlock(ServiceModeParams& params, size_t index,
     }
     block.Set("samples", params.dump.samples.load());
     block.Set("invalid_samples", params.dump.invalid_samples.load());
+    {
+        // Held by the processing loop only while it stores a sample.
+        std::lock_guard<std::mutex> lock(params.data_mutex);
+        block.Set("ring_clients", params.feed.ring_clients);
+        block.Set("ring_last_seq",
+                  params.feed.ring ? DumpValue(params.feed.ring->last_seq()) : DumpValue());
+    }
     const int64_t last = params.dump.last_sample_ns.load();
     block.Set("last_sample_age_ms",
               last == 0
@@ -132,6 +139,7 @@ DumpValue ServiceDumpState::Clients(
         client.Set("polls_refused", entry->counters.polls_refused.load());
         client.Set("on_sample", entry->delivery.on_sample);
         client.Set("samples_dropped", entry->counters.samples_dropped->load());
+        client.Set("ring", entry->delivery.ring);
     }
     return shown;
 }
