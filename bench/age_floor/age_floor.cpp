@@ -12,7 +12,6 @@
 //
 // Prints "p50 X ms, p99 Y ms (N events)".
 #include <android-base/file.h>
-#include <time.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -26,11 +25,13 @@
 #include <thread>
 #include <vector>
 
+#include "ages.h"
 #include "flags.h"
 #include "peers.h"
 
 namespace {
 
+using vyr_bench::BootTimeNs;
 using vyr_bench::kEventBytes;
 using vyr_bench::kReplyBytes;
 
@@ -42,12 +43,6 @@ struct Options {
     int period_ms = 33;
     double seconds = 10;
 };
-
-int64_t BootTimeNs() {
-    timespec now{};
-    clock_gettime(CLOCK_BOOTTIME, &now);
-    return int64_t{now.tv_sec} * 1000000000 + now.tv_nsec;
-}
 
 std::atomic<bool> g_stop{false};
 std::atomic<bool> g_counting{false};
@@ -140,16 +135,6 @@ int main(int argc, char** argv) {
     vyr_bench::EndPeers(fds);
     std::vector<int64_t> all;
     for (const auto& client : ages) all.insert(all.end(), client.begin(), client.end());
-    if (all.empty()) {
-        printf("no events\n");
-        return 1;
-    }
-    std::sort(all.begin(), all.end());
-    const auto at = [&all](double q) {
-        return static_cast<double>(
-                   all[std::min(all.size() - 1, static_cast<size_t>(q * all.size()))]) /
-               1e6;
-    };
-    printf("p50 %.2f ms, p99 %.2f ms (%zu events)\n", at(0.5), at(0.99), all.size());
-    return 0;
+    printf("%s\n", vyr_bench::AgeSummary(&all).c_str());
+    return all.empty() ? 1 : 0;
 }
