@@ -69,6 +69,11 @@ class FakeService : public aidl::android::vyr::BnVYRService {
         *result = -38;
         return ndk::ScopedAStatus::ok();
     }
+    ndk::ScopedAStatus EnableRing(int32_t, int32_t, ndk::ScopedFileDescriptor*,
+                                  int32_t* result) override {
+        *result = -38;
+        return ndk::ScopedAStatus::ok();
+    }
     ndk::ScopedAStatus PollOnce(int32_t handle, Event* event, int32_t* result) override {
         if (handle != 42) {
             *result = -61;
@@ -178,6 +183,34 @@ TEST(OptionsTest, StreamOptions) {
     EXPECT_FALSE(ParseStreamOptions({"als", "--callback", "--callback-delay", "0"}, &bad, &error));
 }
 
+TEST(OptionsTest, RingOptions) {
+    RingOptions options;
+    std::string error;
+    ASSERT_TRUE(ParseRingOptions({"light", "--period", "20", "--seconds", "2.5", "--json"},
+                                 &options, &error))
+        << error;
+    EXPECT_EQ(options.mode, kModeAls);
+    EXPECT_EQ(options.period_ms, 20);
+    EXPECT_DOUBLE_EQ(options.seconds.value_or(0), 2.5);
+    EXPECT_TRUE(options.json);
+    RingOptions plain;
+    ASSERT_TRUE(ParseRingOptions({"range"}, &plain, &error)) << error;
+    EXPECT_EQ(plain.mode, kModeRange);
+    EXPECT_EQ(plain.period_ms, 100);
+    EXPECT_FALSE(plain.seconds);
+    EXPECT_FALSE(plain.json);
+    RingOptions bad;
+    EXPECT_FALSE(ParseRingOptions({}, &bad, &error));
+    EXPECT_EQ(error, "ring needs a sensor: als or range");
+    EXPECT_FALSE(ParseRingOptions({"sonar"}, &bad, &error));
+    EXPECT_FALSE(ParseRingOptions({"range", "--period", "0"}, &bad, &error));
+    EXPECT_FALSE(ParseRingOptions({"range", "--period"}, &bad, &error));
+    EXPECT_FALSE(ParseRingOptions({"range", "--seconds", "-1"}, &bad, &error));
+    EXPECT_FALSE(ParseRingOptions({"range", "--callback"}, &bad, &error));
+    EXPECT_EQ(error, "unknown ring option '--callback'");
+    EXPECT_FALSE(ParseRingOptions({"range", "--count", "3"}, &bad, &error));
+}
+
 TEST(OptionsTest, GlobalTimeoutAnywhere) {
     GlobalOptions options;
     std::string error;
@@ -192,6 +225,12 @@ TEST(OptionsTest, GlobalTimeoutAnywhere) {
 
 TEST(OptionsTest, UsageListsDump) {
     EXPECT_NE(UsageText().find("\n  dump [--json]  "), std::string::npos) << UsageText();
+}
+
+TEST(OptionsTest, UsageListsRing) {
+    EXPECT_NE(UsageText().find("\n  ring als|range [--period MS] [--seconds S] [--json]\n"),
+              std::string::npos)
+        << UsageText();
 }
 
 TEST(EventFormatTest, FloatsReadBackExactly) {
@@ -245,6 +284,14 @@ TEST(EventFormatTest, AlsJsonNamesTheValues) {
               "\"value0\":4500,"
               "\"value1\":120.5,\"data\":[1,2,3,5,4],\"lux\":120.5,\"color_temperature\":4500,"
               "\"channels\":[1,2,3,5,4],\"boottime_ns\":1000,\"received_boottime_ns\":1250}");
+}
+
+TEST(EventFormatTest, RingLineAddsTheSeqAndTheAgeAtRead) {
+    Event event = RangeEvent(1);
+    event.timestamp = 40;
+    event.boottime = 5000000;
+    EXPECT_EQ(FormatRingSampleReadable(kModeRange, 17, event, 7250000),
+              FormatEventReadable(kModeRange, event) + " seq=17 age=2.250 ms");
 }
 
 DemoState StateWithThreeZones() {

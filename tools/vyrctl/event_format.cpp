@@ -115,6 +115,14 @@ std::string FormatEventReadable(int32_t mode, const Event& event) {
     return "mode " + std::to_string(mode) + " " + FormatEventRaw(event);
 }
 
+std::string FormatRingSampleReadable(int32_t mode, uint64_t seq, const Event& event,
+                                     int64_t received_boottime_ns) {
+    char tail[80];
+    snprintf(tail, sizeof(tail), " seq=%llu age=%.3f ms", static_cast<unsigned long long>(seq),
+             static_cast<double>(received_boottime_ns - event.boottime) / 1e6);
+    return FormatEventReadable(mode, event) + tail;
+}
+
 std::string FormatEventJson(int32_t mode, int32_t handle, const Event& event,
                             int64_t received_boottime_ns) {
     std::string json =

@@ -54,6 +54,11 @@ std::string FormatFloat(float value);
 std::string FormatEventRaw(const aidl::android::vyr::Event& event);
 // One human-readable line with the decoded values of the given mode.
 std::string FormatEventReadable(int32_t mode, const aidl::android::vyr::Event& event);
+// The line of `vyrctl ring`: FormatEventReadable, then the sample's seq in the ring and its age
+// when it was read (received_boottime_ns less the reading's boot time), in milliseconds.
+std::string FormatRingSampleReadable(int32_t mode, uint64_t seq,
+                                     const aidl::android::vyr::Event& event,
+                                     int64_t received_boottime_ns);
 // One JSON object (no newline) with the raw fields and the decoded values, then the reading's
 // boot time ("boottime_ns") and the boot time at which OnEvent (or the poll) returned it
 // ("received_boottime_ns"): the sample's age when the client got it is their difference.

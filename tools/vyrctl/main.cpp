@@ -15,6 +15,7 @@
 #include "line_writer.h"
 #include "one_shot_commands.h"
 #include "options.h"
+#include "ring_command.h"
 #include "shell.h"
 #include "stop_signal.h"
 #include "stream_command.h"
@@ -62,10 +63,13 @@ int main(int argc, char** argv) {
 
     // Check the arguments before waiting for the service, so that typos fail at once.
     StreamOptions stream;
+    RingOptions ring;
     DemoViewOptions demo;
     std::vector<int32_t> values;
     if (command == "stream") {
         if (!ParseStreamOptions(global.args, &stream, &error)) return UsageError(&err, error);
+    } else if (command == "ring") {
+        if (!ParseRingOptions(global.args, &ring, &error)) return UsageError(&err, error);
     } else if (command == "demo-view") {
         if (!ParseDemoViewOptions(global.args, &demo, &error)) return UsageError(&err, error);
     } else if (command == "configure") {
@@ -97,6 +101,7 @@ int main(int argc, char** argv) {
         return 0;
     }
     if (command == "stream") return RunStream(*connection, stream, &out, &err);
+    if (command == "ring") return RunRing(*connection, ring, &out, &err);
     if (command == "demo-view") return RunDemoView(*connection, demo, &out, &err);
     if (command == "configure") return RunConfigure(*connection, values, &out, &err);
     if (command == "torch") return RunTorch(*connection, values[0], &out, &err);

@@ -87,6 +87,24 @@ bool TakePositiveInt(const std::vector<std::string>& args, size_t* i, const std:
     return true;
 }
 
+// The sensor that `command` names in its first argument: als (or light) or range.
+bool TakeSensor(const std::vector<std::string>& args, const std::string& command, int32_t* mode,
+                std::string* error) {
+    if (args.empty()) {
+        *error = command + " needs a sensor: als or range";
+        return false;
+    }
+    if (args[0] == "als" || args[0] == "light") {
+        *mode = kModeAls;
+    } else if (args[0] == "range") {
+        *mode = kModeRange;
+    } else {
+        *error = "unknown sensor '" + args[0] + "' (use als or range)";
+        return false;
+    }
+    return true;
+}
+
 }  // namespace
 
 bool ParseGlobalOptions(const std::vector<std::string>& argv, GlobalOptions* options,
@@ -114,18 +132,7 @@ bool ParseGlobalOptions(const std::vector<std::string>& argv, GlobalOptions* opt
 
 bool ParseStreamOptions(const std::vector<std::string>& args, StreamOptions* options,
                         std::string* error) {
-    if (args.empty()) {
-        *error = "stream needs a sensor: als or range";
-        return false;
-    }
-    if (args[0] == "als" || args[0] == "light") {
-        options->mode = kModeAls;
-    } else if (args[0] == "range") {
-        options->mode = kModeRange;
-    } else {
-        *error = "unknown sensor '" + args[0] + "' (use als or range)";
-        return false;
-    }
+    if (!TakeSensor(args, "stream", &options->mode, error)) return false;
     bool chose_delivery = false;
     for (size_t i = 1; i < args.size(); ++i) {
         const std::string& arg = args[i];
@@ -173,6 +180,27 @@ bool ParseStreamOptions(const std::vector<std::string>& args, StreamOptions* opt
     return true;
 }
 
+bool ParseRingOptions(const std::vector<std::string>& args, RingOptions* options,
+                      std::string* error) {
+    if (!TakeSensor(args, "ring", &options->mode, error)) return false;
+    for (size_t i = 1; i < args.size(); ++i) {
+        const std::string& arg = args[i];
+        if (arg == "--period") {
+            if (!TakePositiveInt(args, &i, arg, &options->period_ms, error)) return false;
+        } else if (arg == "--seconds") {
+            double seconds = 0;
+            if (!TakeSeconds(args, &i, arg, &seconds, error)) return false;
+            options->seconds = seconds;
+        } else if (arg == "--json") {
+            options->json = true;
+        } else {
+            *error = "unknown ring option '" + arg + "'";
+            return false;
+        }
+    }
+    return true;
+}
+
 bool ParseDemoViewOptions(const std::vector<std::string>& args, DemoViewOptions* options,
                           std::string* error) {
     for (size_t i = 0; i < args.size(); ++i) {
@@ -209,6 +237,12 @@ std::string UsageText() {
            "                             carries on across restarts of the service unless\n"
            "                             --no-reconnect; a callback stream of interface 2 (the\n"
            "                             default) gets each sample as it is read, 1 on a timer\n"
+           "  ring als|range [--period MS] [--seconds S] [--json]\n"
+           "                             enable one sensor with EnableRing and print each sample\n"
+           "                             read from the shared ring, with its age when read;\n"
+           "                             --json prints the lines of stream --json; a gap\n"
+           "                             (samples overwritten before they were read) is\n"
+           "                             reported on stderr\n"
            "  configure V0 ... V10       send eleven control values to the range sensor\n"
            "  torch STATE                tell the light sensor the camera torch state\n"
            "  dump [--json]              the service's state: sensors, modes, clients, queues,\n"

@@ -46,6 +46,15 @@ struct StreamOptions {
     int32_t callback_delay_ms = 0;
 };
 
+// `vyrctl ring`: one handle enabled with EnableRing, its samples read from the ring.
+struct RingOptions {
+    int32_t mode = kModeRange;
+    int32_t period_ms = 100;
+    // Read this long, then stop; unset: until Ctrl-C or SIGTERM.
+    std::optional<double> seconds;
+    bool json = false;
+};
+
 struct DemoViewOptions {
     double seconds = 15.0;
     std::optional<double> torch_at_s;
@@ -57,6 +66,8 @@ bool ParseGlobalOptions(const std::vector<std::string>& argv, GlobalOptions* opt
                         std::string* error);
 bool ParseStreamOptions(const std::vector<std::string>& args, StreamOptions* options,
                         std::string* error);
+bool ParseRingOptions(const std::vector<std::string>& args, RingOptions* options,
+                      std::string* error);
 bool ParseDemoViewOptions(const std::vector<std::string>& args, DemoViewOptions* options,
                           std::string* error);
 

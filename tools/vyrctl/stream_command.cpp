@@ -3,7 +3,6 @@
 
 #include "stream_command.h"
 
-#include <time.h>
 #include <vyr/sensor_client.h>
 
 #include <algorithm>
@@ -11,6 +10,7 @@
 #include <chrono>
 #include <thread>
 
+#include "boot_clock.h"
 #include "event_format.h"
 #include "event_queue.h"
 #include "result_text.h"
@@ -26,12 +26,6 @@ using vyr::SensorClient;
 namespace {
 
 constexpr milliseconds kWaitSlice{50};
-
-int64_t BootTimeNs() {
-    timespec now{};
-    clock_gettime(CLOCK_BOOTTIME, &now);
-    return int64_t{now.tv_sec} * 1000000000 + now.tv_nsec;
-}
 
 class Stream : public vyr::SensorClientListener {
   public:
