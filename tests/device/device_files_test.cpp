@@ -276,6 +276,38 @@ TEST_F(DeviceFilesTest, AClientAttributeWithoutBinderUseFails) {
                       "client vyrservice_client finds vyrservice_service but has no binder_use");
 }
 
+// The sample ring: the service's memfd has a type of its own, which its clients may receive over
+// binder and map.
+TEST_F(DeviceFilesTest, ARingClientThatMayNotMapTheServicesMemoryFails) {
+    Edit("sepolicy/vyrservice.te",
+         "allow vyrservice_client vyrservice_tmpfs:file { getattr map read write };\n", "");
+    EXPECT_FAILS_WITH(
+        CheckCopy(), "vyrservice_client lacks { getattr map read write } on vyrservice_tmpfs:file");
+}
+
+TEST_F(DeviceFilesTest, ARingClientWithoutTheMapPermissionFails) {
+    Edit("sepolicy/vyrservice.te", "vyrservice_tmpfs:file { getattr map read write }",
+         "vyrservice_tmpfs:file { getattr read write }");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice_client lacks { map } on vyrservice_tmpfs:file");
+}
+
+// Read-only as the mapping is, binder checks the write mode of the read-write descriptor.
+TEST_F(DeviceFilesTest, ARingClientThatMayNotReceiveAWritableDescriptorFails) {
+    Edit("sepolicy/vyrservice.te", "vyrservice_tmpfs:file { getattr map read write }",
+         "vyrservice_tmpfs:file { getattr map read }");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice_client lacks { write } on vyrservice_tmpfs:file");
+}
+
+TEST_F(DeviceFilesTest, AServiceWhoseMemfdsAreNotLabelledFails) {
+    Edit("sepolicy/vyrservice.te", "tmpfs_domain(vyrservice)\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "no tmpfs_domain(vyrservice)");
+}
+
+TEST_F(DeviceFilesTest, AClientThatMayNotUseTheServicesDescriptorsFails) {
+    Edit("sepolicy/vyrservice.te", "binder_call(vyrservice_client, vyrservice)\n", "");
+    EXPECT_FAILS_WITH(CheckCopy(), "vyrservice_client may not use the descriptors of vyrservice");
+}
+
 TEST_F(DeviceFilesTest, AServiceDomainWithoutBinderUseFails) {
     Edit("sepolicy/vyrservice.te", "binder_use(vyrservice)\n", "");
     EXPECT_FAILS_WITH(CheckCopy(), "vyrservice adds vyrservice_service but has no binder_use");

@@ -18,6 +18,9 @@
   servicemanager on /dev/binder, so service_contexts labels every name that the code registers
   (and nothing else) with a service_manager_type, the registering domain and every client
   attribute have binder_use, and no vndservice_contexts or vndbinder_use is left;
+- a service that hands out shared memory (the sample ring, made with libcutils' ashmem) labels its
+  memfds with a type of its own (<domain>_tmpfs, tmpfs_domain), and every client attribute that
+  calls it may use its descriptors (fd use) and receive and map that type;
 - the init service runs the path where Android.bp installs the vendor binary that carries the .rc;
 - every .cpp of the service, the listener, the client library, vyrctl and the sensor doubles is
   in Android.bp, and (with --cmake-sources, written by the host build) the host build compiles the
@@ -73,6 +76,12 @@ DEVICE_FOLDERS = SERVICE_FOLDERS + ["tools/vyrctl", "sensors/doubles"]
 # Module types that compile C++ of this tree.
 CC_MODULE_TYPES = {"cc_library", "cc_library_static", "cc_library_shared", "cc_binary", "cc_test",
                    "cc_fuzz"}
+# What a client needs of the service's memfd type to receive the ring's read-write descriptor over
+# binder (read and write: binder checks each access mode of a descriptor it passes) and map it
+# (getattr for its size, map).
+RING_CLIENT_PERMISSIONS = {"getattr", "map", "read", "write"}
+# The call that makes the shared memory that the service hands its clients.
+SHARED_MEMORY_CALL = "ashmem_create_region"
 # The closed sensor libraries: what only the service binary may link.
 SENSOR_LIBRARIES = {"libambient_light_sensor", "libubk_range_sensor"}
 # The lowest platform version whose NDK has every call that the code makes.
@@ -393,6 +402,89 @@ def check_no_calls_into_shell(checker):
                                    "its clients' domains, never the shell")
 
 
+def declared_names(texts):
+    return {body.split(",")[0].strip() for text in texts.values()
+            for _, body in re.findall(r"\b(type|attribute)\s+([^;]+);", text)}
+
+
+def allowed_permissions(texts, subject, target, cls):
+    """The permissions that allow rules give subject on target:cls, sets and attributes named as
+    they are written (no expansion)."""
+    permissions = set()
+    rule = re.compile(r"\ballow\s+(\{[^}]*\}|\S+)\s+(\{[^}]*\}|[^\s:]+)\s*:\s*(\{[^}]*\}|\w+)\s+"
+                      r"(\{[^}]*\}|\w+)\s*;")
+    for text in texts.values():
+        for subjects, targets, classes, perms in rule.findall(text):
+            if (subject in re.findall(r"\w+", subjects) and target in re.findall(r"\w+", targets)
+                    and cls in re.findall(r"\w+", classes)):
+                permissions.update(re.findall(r"\w+", perms))
+    return permissions
+
+
+def added_services(texts, domain):
+    """The service_manager types that `domain` adds."""
+    return {arguments[1] for text in texts.values()
+            for arguments in macro_calls(text, "add_service")
+            if len(arguments) == 2 and arguments[0] == domain}
+
+
+def client_attributes(texts, domain, attributes):
+    """The attributes that may find a name that `domain` adds: its clients."""
+    names = added_services(texts, domain)
+    clients = set()
+    for text in texts.values():
+        for subjects, target in re.findall(
+                r"\ballow\s+([^;:]+?)\s+(\w+)\s*:\s*service_manager\s+[^;]*\bfind\b", text):
+            if target in names:
+                clients.update(s for s in re.findall(r"\w+", subjects) if s in attributes)
+    return sorted(clients)
+
+
+def makes_shared_memory(checker, folder):
+    for directory, _, files in os.walk(os.path.join(checker.root, folder)):
+        for name in files:
+            if name.endswith(".cpp"):
+                relative = os.path.relpath(os.path.join(directory, name), checker.root)
+                if SHARED_MEMORY_CALL in checker.read(relative):
+                    return True
+    return False
+
+
+def check_ring_policy(checker):
+    """The service's sample ring reaches its clients: a memfd labelled with the service's own
+    tmpfs type, a descriptor that binder may pass on, a mapping the client may make."""
+    if not makes_shared_memory(checker, "vyrservice"):
+        return
+    texts = {te: policy_text(checker, te) for te in policy_files(checker, suffix=".te")}
+    declared = declared_names(texts)
+    attributes = {body.strip() for text in texts.values()
+                  for body in re.findall(r"\battribute\s+([^;]+);", text)}
+    where = "sepolicy/vyrservice.te"
+    for service in sorted(service_domains(texts)):
+        memory = service + "_tmpfs"
+        if memory not in declared:
+            checker.defect(where, f"{memory} is not declared: the sample ring that {service} makes "
+                                  "needs a type of its own for its clients to map")
+        if not any(arguments == [service] for text in texts.values()
+                   for arguments in macro_calls(text, "tmpfs_domain")):
+            checker.defect(where, f"no tmpfs_domain({service}): the memfd of its sample ring would "
+                                  f"be plain tmpfs, not {memory}")
+        clients = client_attributes(texts, service, attributes)
+        for client in clients:
+            # binder_call(client, service) allows fd use among its rules.
+            uses_fds = ("use" in allowed_permissions(texts, client, service, "fd")
+                        or any(arguments == [client, service] for text in texts.values()
+                               for arguments in macro_calls(text, "binder_call")))
+            if not uses_fds:
+                checker.defect(where, f"{client} may not use the descriptors of {service} (fd use, "
+                                      f"as binder_call({client}, {service}) allows): binder would "
+                                      "not pass it the sample ring")
+            missing = RING_CLIENT_PERMISSIONS - allowed_permissions(texts, client, memory, "file")
+            if missing:
+                checker.defect(where, f"{client} lacks {{ {' '.join(sorted(missing))} }} on "
+                                      f"{memory}:file: it cannot receive and map the sample ring")
+
+
 def check_backlight_label(checker):
     paths = []
     for contexts in policy_files(checker, name="genfs_contexts"):
@@ -683,6 +775,7 @@ def main():
     check_binder_path(checker)
     check_binary_labels(checker, modules)
     check_no_calls_into_shell(checker)
+    check_ring_policy(checker)
     check_backlight_label(checker)
     check_sources(checker, modules, args.cmake_sources)
     check_host_only(checker, modules)
