@@ -80,6 +80,10 @@ class BenchService : public BnVYRService {
         return Set(r, handle + period);
     }
     ndk::ScopedAStatus Flush(int32_t, int32_t* r) override { return Set(r, 0); }
+    ndk::ScopedAStatus EnableRing(int32_t, int32_t, ndk::ScopedFileDescriptor*,
+                                  int32_t* r) override {
+        return Set(r, -38);
+    }
 
   private:
     static ndk::ScopedAStatus Set(int32_t* r, int32_t value) {

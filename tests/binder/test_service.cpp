@@ -11,6 +11,8 @@
 #include <chrono>
 #include <string>
 
+#include "test_descriptors.h"
+
 namespace vyr_test::binder {
 
 TestService::~TestService() {
@@ -118,6 +120,21 @@ ndk::ScopedAStatus TestService::EnableOnSample(int32_t, int32_t, int32_t, int32_
 
 ndk::ScopedAStatus TestService::Flush(int32_t, int32_t* result) {
     *result = -ENOSYS;
+    return ndk::ScopedAStatus::ok();
+}
+
+std::string TestService::RingText(int32_t handle, int32_t period) {
+    return "ring " + std::to_string(handle) + " every " + std::to_string(period) + " ms\n";
+}
+
+ndk::ScopedAStatus TestService::EnableRing(int32_t handle, int32_t period,
+                                           ndk::ScopedFileDescriptor* ring, int32_t* result) {
+    if (handle < 0) {
+        *result = -ENOSYS;
+        return ndk::ScopedAStatus::ok();
+    }
+    *ring = MakeTextFile(kRingName, RingText(handle, period));
+    *result = ring->get() < 0 ? -errno : 0;
     return ndk::ScopedAStatus::ok();
 }
 

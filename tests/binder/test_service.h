@@ -9,6 +9,7 @@
 #include <atomic>
 #include <condition_variable>
 #include <mutex>
+#include <string>
 #include <thread>
 #include <vector>
 
@@ -24,7 +25,9 @@ using aidl::android::vyr::IVYRService;
 // Open(kQueryTorch) returns the last torch state; Open(kTorchCalleeLater) returns at once and
 // 100 ms later looks up kCalleeName and sets its torch state to kCalleeTorch; Close(n > 0)
 // delivers n events to the stored callback from another thread; EnableLowPower(kBlockForever,
-// ...) never returns. Its dump writes "dump:" and its arguments on one line; with the argument
+// ...) never returns. EnableRing(handle >= 0, period) hands back a file named kRingName that
+// holds RingText(handle, period); for a negative handle, -38 and no file, as the service answers
+// an unknown handle. Its dump writes "dump:" and its arguments on one line; with the argument
 // "big", 4 MiB after that, and with "slow", a line every 10 ms for 10 s.
 class TestService : public BnVYRService {
   public:
@@ -35,6 +38,8 @@ class TestService : public BnVYRService {
     static constexpr const char* kCalleeName = "vyr.callee";
     static constexpr int32_t kCalleeTorch = 7;
     static constexpr int32_t kBlockForever = 999;
+    static constexpr const char* kRingName = "vyr.test.ring";
+    static std::string RingText(int32_t handle, int32_t period);
 
     ~TestService() override;
     ndk::ScopedAStatus Open(int32_t mode, int32_t* result) override;
@@ -51,6 +56,8 @@ class TestService : public BnVYRService {
     ndk::ScopedAStatus EnableOnSample(int32_t handle, int32_t period, int32_t max_report_latency,
                                       int32_t* result) override;
     ndk::ScopedAStatus Flush(int32_t handle, int32_t* result) override;
+    ndk::ScopedAStatus EnableRing(int32_t handle, int32_t period, ndk::ScopedFileDescriptor* ring,
+                                  int32_t* result) override;
     binder_status_t dump(int fd, const char** args, uint32_t num_args) override;
 
     std::shared_ptr<IEventCallback> callback();

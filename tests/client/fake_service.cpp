@@ -150,6 +150,13 @@ class FakeService : public aidl::android::vyr::BnVYRService {
         Say("Flush " + std::to_string(handle) + " -> 0");
         return ndk::ScopedAStatus::ok();
     }
+    // No ring here: answered as the service answers an unknown handle, with no descriptor.
+    ndk::ScopedAStatus EnableRing(int32_t handle, int32_t period, ndk::ScopedFileDescriptor*,
+                                  int32_t* result) override {
+        *result = -38;
+        Say("EnableRing " + std::to_string(handle) + " " + std::to_string(period) + " -> -38");
+        return ndk::ScopedAStatus::ok();
+    }
 #endif
     ndk::ScopedAStatus EnableLowPower(int32_t handle, bool enable, int32_t* result) override {
         // As the service does for range handles.

@@ -8,6 +8,7 @@
 //   3: a parcel read value by value, the next byte choosing each read
 #include <aidl/android/vyr/BnVYRService.h>
 #include <android/binder_parcel_utils.h>
+#include <sys/mman.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -55,6 +56,11 @@ class NullService : public BnVYRService {
         return Ok(r);
     }
     ndk::ScopedAStatus Flush(int32_t, int32_t* r) override { return Ok(r); }
+    ndk::ScopedAStatus EnableRing(int32_t, int32_t, ndk::ScopedFileDescriptor* ring,
+                                  int32_t* r) override {
+        ring->set(memfd_create("fuzz.ring", MFD_CLOEXEC));
+        return Ok(r);
+    }
 
   private:
     static ndk::ScopedAStatus Ok(int32_t* r) {
