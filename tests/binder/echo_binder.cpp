@@ -3,6 +3,13 @@
 
 #include "echo_binder.h"
 
+#include <android/binder_parcel_utils.h>
+#include <unistd.h>
+
+#include <string>
+
+#include "test_descriptors.h"
+
 namespace vyr_test::binder {
 namespace {
 
@@ -11,6 +18,54 @@ void* OnCreate(void* args) {
 }
 
 void OnDestroy(void* /*user_data*/) {}
+
+binder_status_t EchoDescriptor(const AParcel* in, AParcel* out) {
+    ndk::ScopedFileDescriptor received;
+    binder_status_t status = ndk::AParcel_readNullableParcelFileDescriptor(in, &received);
+    if (status != STATUS_OK) return status;
+    const std::string text = received.get() < 0 ? std::string() : ReadText(received.get());
+    status = ndk::AParcel_writeString(out, text);
+    if (status != STATUS_OK) return status;
+    return ndk::AParcel_writeNullableParcelFileDescriptor(out, received);
+}
+
+binder_status_t WriteToDescriptor(const AParcel* in) {
+    ndk::ScopedFileDescriptor received;
+    binder_status_t status = ndk::AParcel_readRequiredParcelFileDescriptor(in, &received);
+    if (status != STATUS_OK) return status;
+    std::string text;
+    status = ndk::AParcel_readString(in, &text);
+    if (status != STATUS_OK) return status;
+    if (write(received.get(), text.data(), text.size()) != static_cast<ssize_t>(text.size())) {
+        return STATUS_UNKNOWN_ERROR;
+    }
+    return STATUS_OK;
+}
+
+binder_status_t ForwardDescriptor(const AParcel* in, AParcel* out) {
+    ndk::SpAIBinder target;
+    ndk::ScopedFileDescriptor received;
+    std::string text;
+    binder_status_t status = ndk::AParcel_readRequiredStrongBinder(in, &target);
+    if (status == STATUS_OK) status = ndk::AParcel_readRequiredParcelFileDescriptor(in, &received);
+    if (status == STATUS_OK) status = ndk::AParcel_readString(in, &text);
+    if (status != STATUS_OK) return status;
+    if (!AIBinder_associateClass(target.get(), EchoClass())) return STATUS_BAD_TYPE;
+    AParcel* call = nullptr;
+    status = AIBinder_prepareTransaction(target.get(), &call);
+    if (status != STATUS_OK) return status;
+    status = ndk::AParcel_writeRequiredParcelFileDescriptor(call, received);
+    if (status == STATUS_OK) status = ndk::AParcel_writeString(call, text);
+    if (status != STATUS_OK) {
+        AParcel_delete(call);
+        return status;
+    }
+    AParcel* reply = nullptr;
+    const binder_status_t forwarded =
+        AIBinder_transact(target.get(), kWriteToDescriptor, &call, &reply, 0);
+    AParcel_delete(reply);
+    return AParcel_writeInt32(out, forwarded);
+}
 
 binder_status_t OnTransact(AIBinder* /*binder*/, transaction_code_t code, const AParcel* in,
                            AParcel* out) {
@@ -28,6 +83,9 @@ binder_status_t OnTransact(AIBinder* /*binder*/, transaction_code_t code, const 
         if (status != STATUS_OK) return status;
         return AParcel_writeInt32(out, static_cast<int32_t>(AIBinder_getCallingPid()));
     }
+    if (code == kEchoDescriptor) return EchoDescriptor(in, out);
+    if (code == kWriteToDescriptor) return WriteToDescriptor(in);
+    if (code == kForwardDescriptor) return ForwardDescriptor(in, out);
     return STATUS_UNKNOWN_TRANSACTION;
 }
 

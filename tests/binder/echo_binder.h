@@ -12,6 +12,14 @@ namespace vyr_test::binder {
 // with the caller's uid and pid as the runtime reports them.
 constexpr transaction_code_t kEchoBinder = FIRST_CALL_TRANSACTION;
 constexpr transaction_code_t kIdentity = FIRST_CALL_TRANSACTION + 1;
+// A ParcelFileDescriptor (may be null) in; the text of its file (empty for null) and the same
+// descriptor back.
+constexpr transaction_code_t kEchoDescriptor = FIRST_CALL_TRANSACTION + 2;
+// A ParcelFileDescriptor and a string in; writes the string to the descriptor. Also oneway.
+constexpr transaction_code_t kWriteToDescriptor = FIRST_CALL_TRANSACTION + 3;
+// A binder of this class, a ParcelFileDescriptor and a string in; sends the descriptor and the
+// string on to the binder's kWriteToDescriptor and replies with that call's status.
+constexpr transaction_code_t kForwardDescriptor = FIRST_CALL_TRANSACTION + 4;
 
 const AIBinder_Class* EchoClass();
 ndk::SpAIBinder MakeEcho();

@@ -16,6 +16,7 @@
 #include <vector>
 
 #include "frame_io.h"
+#include "test_descriptors.h"
 #include "thread_count.h"
 #include "wire.h"
 
@@ -186,6 +187,67 @@ TEST(FrameBufferTest, BuffersOfAllConnectionsStayUnderTheProcessLimit) {
         EXPECT_LE(BufferedBytes(), vyr_binder::kMaxBufferedBytesPerProcess);
     }
     EXPECT_TRUE(refused) << peers << " peers of almost 1 MiB each were all buffered";
+}
+
+// `count` copies of `fd`, as the runtime sends a parcel's.
+std::vector<ndk::ScopedFileDescriptor> Copies(int fd, size_t count) {
+    std::vector<ndk::ScopedFileDescriptor> copies;
+    for (size_t i = 0; i < count; ++i) copies.emplace_back(dup(fd));
+    return copies;
+}
+
+// Sends a frame header with `descriptors` on its first byte.
+void SendHeader(int fd, const FrameHeader& header,
+                const std::vector<ndk::ScopedFileDescriptor>& descriptors) {
+    iovec iov{const_cast<FrameHeader*>(&header), sizeof(header)};
+    size_t sent = 0;
+    ASSERT_TRUE(vyr_binder::SendSome(fd, &iov, 1, &sent, descriptors));
+    ASSERT_EQ(sizeof(header), sent);
+}
+
+TEST(FrameBufferTest, EachFrameTakesTheDescriptorsItAnnouncedInOrder) {
+    ndk::ScopedFileDescriptor first = MakeTextFile("vyr.first", "first");
+    ndk::ScopedFileDescriptor second = MakeTextFile("vyr.second", "second");
+    SocketPair pair;
+    FrameHeader header = SmallFrameHeader();
+    header.descriptor_count = 2;
+    std::vector<ndk::ScopedFileDescriptor> two = Copies(first.get(), 1);
+    two.emplace_back(dup(second.get()));
+    SendHeader(pair.writer(), header, two);
+    header.descriptor_count = 1;
+    SendHeader(pair.writer(), header, Copies(second.get(), 1));
+    header.descriptor_count = 0;
+    SendHeader(pair.writer(), header, {});
+    FrameBuffer buffer;
+    vyr_binder::Frame frame;
+    ASSERT_EQ(FrameBuffer::Result::kFrame, buffer.Fill(pair.reader(), true));
+    buffer.Take(&frame);
+    ASSERT_EQ(2u, frame.descriptors.size());
+    EXPECT_EQ("first", ReadText(frame.descriptors[0].get()));
+    EXPECT_EQ("second", ReadText(frame.descriptors[1].get()));
+    ASSERT_EQ(FrameBuffer::Result::kFrame, buffer.Fill(pair.reader(), true));
+    buffer.Take(&frame);
+    ASSERT_EQ(1u, frame.descriptors.size());
+    EXPECT_EQ("second", ReadText(frame.descriptors[0].get()));
+    ASSERT_EQ(FrameBuffer::Result::kFrame, buffer.Fill(pair.reader(), true));
+    buffer.Take(&frame);
+    EXPECT_TRUE(frame.descriptors.empty());
+}
+
+// What a connection that goes away holds of a frame still arriving is closed with its buffer.
+TEST(FrameBufferTest, DescriptorsOfAFrameStillArrivingAreClosedWithTheBuffer) {
+    const std::string name = "vyr.arriving.test";
+    ndk::ScopedFileDescriptor file = MakeTextFile(name, "");
+    SocketPair pair;
+    FrameHeader header = LargeFrameHeader();
+    header.descriptor_count = 2;
+    SendHeader(pair.writer(), header, Copies(file.get(), 2));
+    {
+        FrameBuffer buffer;
+        EXPECT_EQ(FrameBuffer::Result::kNoData, buffer.Fill(pair.reader(), false));
+        EXPECT_EQ(3u, CountOpenTextFiles(getpid(), name));
+    }
+    EXPECT_EQ(1u, CountOpenTextFiles(getpid(), name));
 }
 
 }  // namespace

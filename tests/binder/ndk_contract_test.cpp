@@ -6,8 +6,11 @@
 
 #include <aidl/android/vyr/IVYRService.h>
 #include <android/binder_manager.h>
+#include <android/binder_parcel_utils.h>
 #include <android/binder_process.h>
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -20,7 +23,9 @@
 #include <thread>
 #include <vector>
 
+#include "echo_binder.h"
 #include "process_fixture.h"
+#include "test_descriptors.h"
 #include "test_service.h"
 
 namespace vyr_test::binder {
@@ -467,6 +472,108 @@ TEST_F(CrossProcessTest, CallInFlightFailsAtOnceWhenThePeerDies) {
     EXPECT_TRUE(Eventually([&] { return returned.load(); }, 5s));
     caller.join();
     EXPECT_EQ(STATUS_DEAD_OBJECT, status.load());
+}
+
+// The helper's echo binder, associated with its class for transactions; null if it is not one.
+ndk::SpAIBinder EchoOf(const ndk::SpAIBinder& binder) {
+    if (binder.get() == nullptr || !AIBinder_associateClass(binder.get(), EchoClass())) {
+        return ndk::SpAIBinder();
+    }
+    return binder;
+}
+
+// What a pipe's reader gets until every writer has closed its end; "timed out" after 10 s.
+std::string ReadUntilClosed(int fd) {
+    std::string text;
+    const auto deadline = std::chrono::steady_clock::now() + 10s;
+    for (;;) {
+        const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(
+            deadline - std::chrono::steady_clock::now());
+        pollfd readable{fd, POLLIN, 0};
+        if (left.count() <= 0 || poll(&readable, 1, static_cast<int>(left.count())) <= 0) {
+            return "timed out after \"" + text + "\"";
+        }
+        char buffer[256];
+        const ssize_t n = read(fd, buffer, sizeof(buffer));
+        if (n <= 0) return text;
+        text.append(buffer, static_cast<size_t>(n));
+    }
+}
+
+// A descriptor in a call reaches the other process as a working duplicate of the sender's, and
+// one in the reply comes back the same way; the sender's stays its own (binder_parcel.h: "This
+// does not take ownership of fd"; "The returned fd must be closed").
+TEST_F(CrossProcessTest, ADescriptorInACallAndInItsReplyIsAWorkingDuplicate) {
+    ASSERT_NE(nullptr, StartServer("vyr.test"));
+    ndk::SpAIBinder echo = EchoOf(WaitForService("vyr.test.echo"));
+    ASSERT_NE(nullptr, echo.get());
+    const std::string text = "written by " + std::to_string(getpid()) + "\n";
+    ndk::ScopedFileDescriptor file = MakeTextFile("vyr.echo.test", text);
+    ASSERT_GE(file.get(), 0);
+    AParcel* in = nullptr;
+    ASSERT_EQ(STATUS_OK, AIBinder_prepareTransaction(echo.get(), &in));
+    ASSERT_EQ(STATUS_OK, ndk::AParcel_writeNullableParcelFileDescriptor(in, file));
+    ndk::ScopedAParcel reply;
+    ASSERT_EQ(STATUS_OK, AIBinder_transact(echo.get(), kEchoDescriptor, &in, reply.getR(), 0));
+    std::string read_there;
+    ASSERT_EQ(STATUS_OK, ndk::AParcel_readString(reply.get(), &read_there));
+    EXPECT_EQ(text, read_there) << "what the other process read through its duplicate";
+    ndk::ScopedFileDescriptor back;
+    ASSERT_EQ(STATUS_OK, ndk::AParcel_readNullableParcelFileDescriptor(reply.get(), &back));
+    ASSERT_GE(back.get(), 0);
+    EXPECT_NE(file.get(), back.get());
+    EXPECT_NE(0, fcntl(back.get(), F_GETFD) & FD_CLOEXEC);
+    // The same open file, offset and all: what is written through one is read through the other.
+    ASSERT_EQ(4, write(back.get(), "back", 4));
+    EXPECT_EQ(text + "back", ReadText(file.get()));
+
+    // A null one crosses as null.
+    ASSERT_EQ(STATUS_OK, AIBinder_prepareTransaction(echo.get(), &in));
+    ASSERT_EQ(STATUS_OK, AParcel_writeParcelFileDescriptor(in, -1));
+    ndk::ScopedAParcel null_reply;
+    ASSERT_EQ(STATUS_OK, AIBinder_transact(echo.get(), kEchoDescriptor, &in, null_reply.getR(), 0));
+    ASSERT_EQ(STATUS_OK, ndk::AParcel_readString(null_reply.get(), &read_there));
+    EXPECT_EQ("", read_there);
+    ASSERT_EQ(STATUS_OK, ndk::AParcel_readNullableParcelFileDescriptor(null_reply.get(), &back));
+    EXPECT_EQ(-1, back.get());
+}
+
+// A oneway call carries its descriptor too. The pipe reaches its end once the other process has
+// closed every copy it was given: its parcel's and the one it read.
+TEST_F(CrossProcessTest, ADescriptorInAOnewayCallIsUsedAndClosedByTheReceiver) {
+    ASSERT_NE(nullptr, StartServer("vyr.test"));
+    ndk::SpAIBinder echo = EchoOf(WaitForService("vyr.test.echo"));
+    ASSERT_NE(nullptr, echo.get());
+    int ends[2];
+    ASSERT_EQ(0, pipe2(ends, O_CLOEXEC));
+    ndk::ScopedFileDescriptor reader(ends[0]);
+    ndk::ScopedFileDescriptor writer(ends[1]);
+    AParcel* in = nullptr;
+    ASSERT_EQ(STATUS_OK, AIBinder_prepareTransaction(echo.get(), &in));
+    ASSERT_EQ(STATUS_OK, ndk::AParcel_writeRequiredParcelFileDescriptor(in, writer));
+    ASSERT_EQ(STATUS_OK, ndk::AParcel_writeString(in, std::string("oneway\n")));
+    AParcel* out = nullptr;
+    ASSERT_EQ(STATUS_OK, AIBinder_transact(echo.get(), kWriteToDescriptor, &in, &out, FLAG_ONEWAY));
+    AParcel_delete(out);
+    writer.set(-1);
+    EXPECT_EQ("oneway\n", ReadUntilClosed(reader.get()));
+}
+
+// The generated code hands back the descriptor of an out ParcelFileDescriptor that the service
+// set, and -1 for one it left null.
+TEST_F(CrossProcessTest, EnableRingHandsBackTheServicesDescriptorInItsReply) {
+    std::shared_ptr<IVYRService> service = StartServer("vyr.test");
+    ASSERT_NE(nullptr, service);
+    ndk::ScopedFileDescriptor ring;
+    int32_t result = -1;
+    ASSERT_TRUE(service->EnableRing(3, 20, &ring, &result).isOk());
+    EXPECT_EQ(0, result);
+    ASSERT_GE(ring.get(), 0);
+    EXPECT_EQ(TestService::RingText(3, 20), ReadText(ring.get()));
+    ndk::ScopedFileDescriptor none;
+    ASSERT_TRUE(service->EnableRing(-1, 20, &none, &result).isOk());
+    EXPECT_EQ(-38, result);
+    EXPECT_EQ(-1, none.get());
 }
 
 }  // namespace

@@ -294,14 +294,5 @@ TEST_F(ParcelTest, LocalBinderRoundTripHoldsAReference) {
     EXPECT_EQ(0, AParcel_getDataSize(p));
 }
 
-TEST_F(ParcelTest, FileDescriptorsAreRefused) {
-    EXPECT_EQ(STATUS_FDS_NOT_ALLOWED, AParcel_writeParcelFileDescriptor(parcel_.get(), 0));
-    EXPECT_EQ(STATUS_OK, AParcel_writeParcelFileDescriptor(parcel_.get(), -1));
-    Rewind();
-    int fd = 5;
-    EXPECT_EQ(STATUS_OK, AParcel_readParcelFileDescriptor(parcel_.get(), &fd));
-    EXPECT_EQ(-1, fd);
-}
-
 }  // namespace
 }  // namespace vyr_test::binder

@@ -4,6 +4,7 @@
 #include "connection.h"
 
 #include <android/binder_parcel_utils.h>
+#include <fcntl.h>
 #include <poll.h>
 #include <pthread.h>
 #include <signal.h>
@@ -31,11 +32,28 @@ namespace {
 constexpr uint64_t kContextObject = 0;
 constexpr transaction_code_t kLookupCode = 1;
 constexpr size_t kMaxKeyBytes = 128;
-// How long a frame that carries a descriptor waits for room in the socket.
-constexpr std::chrono::seconds kDescriptorSendWait{5};
 
 Looper& TheLooper() {
     return ProcessState::Get().looper();
+}
+
+// What a parcel takes of a transaction buffer: a device's parcel holds each descriptor as an
+// object, with its offset, as it holds a binder.
+size_t FootprintOf(const AParcel& parcel) {
+    return TransactionBuffer::Footprint(parcel.data.size(),
+                                        parcel.objects.size() + parcel.fds.size());
+}
+
+// Copies of a parcel's descriptors for the frame that carries them; false when this process has
+// no descriptor left for them.
+bool DuplicateDescriptors(const std::vector<ndk::ScopedFileDescriptor>& from,
+                          std::vector<ndk::ScopedFileDescriptor>* to) {
+    to->reserve(from.size());
+    for (const ndk::ScopedFileDescriptor& descriptor : from) {
+        to->emplace_back(fcntl(descriptor.get(), F_DUPFD_CLOEXEC, 0));
+        if (to->back().get() < 0) return false;
+    }
+    return true;
 }
 
 // The proxies of a dead peer, weakly held until their notices have run (or were dropped).
@@ -136,7 +154,11 @@ void Connection::TakeReadingRoleLocked() {
 }
 
 void Connection::RearmLocked() {
-    if (dead_.load(std::memory_order_relaxed)) return;
+    if (dead_.load(std::memory_order_relaxed)) {
+        // It died while this thread read it, and nobody reads it again.
+        buffer_.Clear();
+        return;
+    }
     // Only new data wakes a thread again; arming does it for what is already there: bytes one
     // read did not take (another connection's turn first), data or a hang-up whose wake-up
     // found the role taken, or the end of the stream behind the last bytes of a peer that hung up.
@@ -203,6 +225,7 @@ bool Connection::DecodeParcel(Frame& frame, AParcel* parcel) {
         return false;
     }
     parcel->data = std::move(frame.data);
+    parcel->fds = std::move(frame.descriptors);
     std::vector<ParcelObject> resolved;
     resolved.reserve(objects.size());
     bool ok = true;
@@ -316,8 +339,8 @@ binder_status_t Connection::EncodeObjectsLocked(const AParcel& parcel,
 }
 
 bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
-                      uint64_t parent, const AParcel* parcel,
-                      const std::vector<WireObject>& objects, int descriptor) {
+                      uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects,
+                      std::vector<ndk::ScopedFileDescriptor> descriptors) {
     std::vector<uint8_t> table;
     if (!objects.empty()) EncodeObjects(objects, &table);
     FrameHeader header{};
@@ -331,7 +354,7 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
     header.transaction_id = id;
     header.target = target;
     header.parent = parent;
-    header.descriptor_count = descriptor >= 0 ? 1 : 0;
+    header.descriptor_count = static_cast<uint32_t>(descriptors.size());
     iovec iov[3] = {
         {&header, sizeof(header)},
         {parcel == nullptr ? nullptr : const_cast<uint8_t*>(parcel->data.data()), header.data_size},
@@ -341,15 +364,9 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
     UniqueLock lock(send_mutex_);
     if (send_refused_) return false;
     size_t sent = 0;
-    if (descriptor >= 0) {
-        // The descriptor must go with the frame's first byte, so this frame cannot wait in the
-        // queue: the caller (a client asking for a dump) waits for room instead.
-        if (!SendFirstByteWithDescriptor(iov, &sent, descriptor)) return false;
-    } else if (pending_out_.empty() && !SendSome(fd_, iov, 3, &sent)) {
-        // Never wait for a peer otherwise: one that does not read must not hold this thread,
-        // which may be the one that other peers' calls need.
-        return false;
-    }
+    // Never wait for a peer: one that does not read must not hold this thread, which may be the
+    // one that other peers' calls need.
+    if (pending_out_.empty() && !SendSome(fd_, iov, 3, &sent, descriptors)) return false;
     if (sent == total) return true;
     if (pending_out_.size() - pending_sent_ + total - sent > kMaxPendingSendBytes) {
         fprintf(stderr, "binder: dropping peer %d: it does not read (over %zu bytes unsent)\n",
@@ -359,7 +376,13 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
     }
     // What the peer has taken goes first, so the queue holds only unsent bytes.
     pending_out_.erase(pending_out_.begin(), pending_out_.begin() + pending_sent_);
+    for (PendingDescriptors& pending : pending_descriptors_) pending.at -= pending_sent_;
     pending_sent_ = 0;
+    // Bytes sent took the descriptors with them.
+    if (sent == 0 && !descriptors.empty()) {
+        pending_descriptors_.push_back(
+            PendingDescriptors{pending_out_.size(), std::move(descriptors)});
+    }
     for (const iovec& part : iov) {
         const uint8_t* bytes = static_cast<const uint8_t*>(part.iov_base);
         const size_t skip = std::min(sent, part.iov_len);
@@ -375,21 +398,30 @@ bool Connection::Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id
     return true;
 }
 
-bool Connection::SendFirstByteWithDescriptor(const iovec* iov, size_t* sent, int descriptor) {
-    const auto deadline = std::chrono::steady_clock::now() + kDescriptorSendWait;
-    while (true) {
-        if (send_refused_ || dead()) return false;
-        if (pending_out_.empty()) {
-            if (!SendSome(fd_, iov, 3, sent, descriptor)) return false;
-            if (*sent > 0) return true;
+bool Connection::SendPendingLocked() {
+    while (pending_sent_ < pending_out_.size()) {
+        // Each frame's descriptors go with its first byte: a send starts there with them, and
+        // stops where the next frame with descriptors starts.
+        const bool with_descriptors =
+            !pending_descriptors_.empty() && pending_descriptors_.front().at == pending_sent_;
+        const size_t next = with_descriptors ? 1 : 0;
+        const size_t end = pending_descriptors_.size() > next ? pending_descriptors_[next].at
+                                                              : pending_out_.size();
+        iovec rest{pending_out_.data() + pending_sent_, end - pending_sent_};
+        size_t sent = 0;
+        if (with_descriptors) {
+            if (!SendSome(fd_, &rest, 1, &sent, pending_descriptors_.front().descriptors)) {
+                return false;
+            }
+            if (sent > 0) pending_descriptors_.pop_front();
+        } else if (!SendSome(fd_, &rest, 1, &sent)) {
+            return false;
         }
-        if (std::chrono::steady_clock::now() >= deadline) return false;
-        // The caller's lock is let go while waiting, so that the queue can drain.
-        send_mutex_.unlock();
-        pollfd writable{fd_, POLLOUT, 0};
-        poll(&writable, 1, 10);
-        send_mutex_.lock();
+        pending_sent_ += sent;
+        // The socket is full.
+        if (pending_sent_ < end) return true;
     }
+    return true;
 }
 
 void Connection::FlushPending() {
@@ -397,12 +429,10 @@ void Connection::FlushPending() {
         bool alive;
         {
             std::lock_guard<std::mutex> lock(send_mutex_);
-            iovec rest{pending_out_.data() + pending_sent_, pending_out_.size() - pending_sent_};
-            size_t sent = 0;
-            alive = !dead() && SendSome(fd_, &rest, 1, &sent);
-            pending_sent_ += sent;
+            alive = !dead() && SendPendingLocked();
             if (!alive || pending_sent_ == pending_out_.size()) {
                 std::vector<uint8_t>().swap(pending_out_);
+                pending_descriptors_.clear();
                 pending_sent_ = 0;
                 flushing_ = false;
                 if (alive) return;
@@ -420,20 +450,20 @@ void Connection::FlushPending() {
 }
 
 bool Connection::AdmitCall(Incoming* call) {
-    const size_t footprint =
-        TransactionBuffer::Footprint(call->data->data.size(), call->data->objects.size());
-    return TransactionBuffer::Reserve(footprint, (call->flags & FLAG_ONEWAY) != 0, &call->charge);
+    return TransactionBuffer::Reserve(FootprintOf(*call->data), (call->flags & FLAG_ONEWAY) != 0,
+                                      &call->charge);
 }
 
 binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, const AParcel& in,
-                                     AParcel* out, binder_flags_t flags, int descriptor) {
+                                     AParcel* out, binder_flags_t flags) {
     const bool oneway = (flags & FLAG_ONEWAY) != 0;
-    // No process's buffer could take it.
-    if (in.objects.size() > kMaxObjects ||
-        !TransactionBuffer::Fits(TransactionBuffer::Footprint(in.data.size(), in.objects.size()),
-                                 oneway)) {
+    // No process's buffer could take it, or no frame could carry it.
+    if (in.objects.size() > kMaxObjects || in.fds.size() > kMaxDescriptorsPerFrame ||
+        !TransactionBuffer::Fits(FootprintOf(in), oneway)) {
         return STATUS_FAILED_TRANSACTION;
     }
+    std::vector<ndk::ScopedFileDescriptor> descriptors;
+    if (!DuplicateDescriptors(in.fds, &descriptors)) return STATUS_FAILED_TRANSACTION;
     Waiter waiter;
     std::vector<WireObject> objects;
     uint64_t id;
@@ -452,7 +482,8 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
         if (reader) TakeReadingRoleLocked();
     }
     uint64_t parent = ScopedCallContext::ParentFor(this);
-    if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects, descriptor)) {
+    if (!Send(FrameType::kTransaction, code, flags, id, target, parent, &in, objects,
+              std::move(descriptors))) {
         {
             std::lock_guard<std::mutex> lock(mutex_);
             RemoveWaiterLocked(id);
@@ -509,8 +540,11 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
             lock.lock();
         }
     }
-    // The connection died before this caller got to read.
-    if (reader) reading_ = false;
+    // The connection died before this caller got to read, and nobody reads it again.
+    if (reader) {
+        reading_ = false;
+        buffer_.Clear();
+    }
     RemoveWaiterLocked(id);
     std::vector<std::shared_ptr<Incoming>> dropped = std::move(waiter.nested);
     std::unique_ptr<AParcel> reply = std::move(waiter.reply);
@@ -520,6 +554,7 @@ binder_status_t Connection::Transact(uint64_t target, transaction_code_t code, c
     if (status == STATUS_OK && reply != nullptr && !oneway) {
         out->data = std::move(reply->data);
         out->objects = std::move(reply->objects);
+        out->fds = std::move(reply->fds);
         out->pos = 0;
     }
     return status;
@@ -544,7 +579,6 @@ bool Connection::HandleTransaction(Frame& frame, std::shared_ptr<Incoming>* out)
     call->id = header.transaction_id;
     call->code = header.code;
     call->flags = header.flags;
-    call->descriptor = std::move(frame.descriptor);
     call->data.reset(new AParcel);
     if (!DecodeParcel(frame, call->data.get())) return false;
     const bool oneway = (header.flags & FLAG_ONEWAY) != 0;
@@ -634,9 +668,13 @@ binder_status_t Connection::ServeDump(Incoming& call) {
     // As for calls: only processes of the registry's owner reach this process at all; root may
     // dump too, as a device's shell may.
     if (peer_uid_ != getuid() && peer_uid_ != 0) return STATUS_PERMISSION_DENIED;
-    if (call.descriptor.get() < 0) return STATUS_BAD_VALUE;
+    int received = -1;
+    if (AParcel_readParcelFileDescriptor(call.data.get(), &received) != STATUS_OK) {
+        return STATUS_BAD_VALUE;
+    }
+    const ndk::ScopedFileDescriptor out(received);
     std::vector<std::string> args;
-    if (!ReadDumpArguments(call.data.get(), &args)) return STATUS_BAD_VALUE;
+    if (out.get() < 0 || !ReadDumpArguments(call.data.get(), &args)) return STATUS_BAD_VALUE;
     std::vector<const char*> argv;
     for (const std::string& arg : args) argv.push_back(arg.c_str());
     // A reader that went away must cost the dump an EPIPE, not the process its life.
@@ -645,8 +683,8 @@ binder_status_t Connection::ServeDump(Incoming& call) {
     sigemptyset(&pipe_signal);
     sigaddset(&pipe_signal, SIGPIPE);
     pthread_sigmask(SIG_BLOCK, &pipe_signal, &old_mask);
-    const binder_status_t status = call.target.get()->Dump(call.descriptor.get(), argv.data(),
-                                                           static_cast<uint32_t>(argv.size()));
+    const binder_status_t status =
+        call.target.get()->Dump(out.get(), argv.data(), static_cast<uint32_t>(argv.size()));
     const timespec no_wait{};
     while (sigtimedwait(&pipe_signal, nullptr, &no_wait) > 0) {
     }
@@ -670,11 +708,13 @@ void Connection::ServeContextCall(Incoming& call) {
 
 void Connection::SendReply(uint64_t id, binder_status_t status, const AParcel& reply) {
     std::vector<WireObject> objects;
-    // The reply goes into the caller's buffer; one that no buffer could take is refused.
+    std::vector<ndk::ScopedFileDescriptor> descriptors;
+    // The reply goes into the caller's buffer; one that no buffer could take, or no frame could
+    // carry, is refused.
     if (status == STATUS_OK &&
-        (reply.objects.size() > kMaxObjects ||
-         !TransactionBuffer::Fits(
-             TransactionBuffer::Footprint(reply.data.size(), reply.objects.size()), false))) {
+        (reply.objects.size() > kMaxObjects || reply.fds.size() > kMaxDescriptorsPerFrame ||
+         !TransactionBuffer::Fits(FootprintOf(reply), false) ||
+         !DuplicateDescriptors(reply.fds, &descriptors))) {
         status = STATUS_FAILED_TRANSACTION;
     }
     if (status == STATUS_OK) {
@@ -683,8 +723,12 @@ void Connection::SendReply(uint64_t id, binder_status_t status, const AParcel& r
         status = EncodeObjectsLocked(reply, &objects);
     }
     const AParcel* body = status == STATUS_OK ? &reply : nullptr;
-    if (status != STATUS_OK) objects.clear();
-    if (!Send(FrameType::kReply, static_cast<uint32_t>(status), 0, id, 0, 0, body, objects)) {
+    if (status != STATUS_OK) {
+        objects.clear();
+        descriptors.clear();
+    }
+    if (!Send(FrameType::kReply, static_cast<uint32_t>(status), 0, id, 0, 0, body, objects,
+              std::move(descriptors))) {
         Die();
     }
 }
@@ -704,6 +748,10 @@ void Connection::Die() {
     std::unordered_map<uint64_t, Export> exports;
     {
         std::lock_guard<std::mutex> lock(mutex_);
+        // Nobody reads it again: what it buffered goes now, the descriptors of a frame still
+        // arriving among it, and not with the last proxy to the peer; also when it died while
+        // this thread read it. A thread reading now drops the rest when it gives the role back.
+        if (!reading_) buffer_.Clear();
         if (dead_.load(std::memory_order_relaxed)) return;
         dead_.store(true, std::memory_order_release);
         // Calls waiting on the peer fail now, before anyone hears of the death.

@@ -12,6 +12,7 @@
 #include <chrono>
 #include <condition_variable>
 #include <cstdint>
+#include <deque>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -56,9 +57,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
     uint64_t serial() const { return serial_; }
     void set_serial(uint64_t serial) { serial_ = serial; }
 
-    // A `descriptor` (not -1) travels with the call, as a dump request's output does.
     binder_status_t Transact(uint64_t target, transaction_code_t code, const AParcel& in,
-                             AParcel* out, binder_flags_t flags, int descriptor = -1);
+                             AParcel* out, binder_flags_t flags);
     // The binder the peer published under `name`, or null.
     binder_status_t Lookup(const std::string& name, ndk::SpAIBinder* binder);
 
@@ -77,8 +77,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
         uint32_t flags;
         std::unique_ptr<AParcel> data;
         ndk::SpAIBinder target;
-        ndk::ScopedFileDescriptor descriptor;  // a dump request's output
-        bool drain_oneway = false;             // run the target's queued oneway calls instead
+        bool drain_oneway = false;  // run the target's queued oneway calls instead
         // Its share of this process's transaction buffer, held until it has been served.
         TransactionBuffer::Charge charge;
     };
@@ -129,13 +128,14 @@ class Connection : public std::enable_shared_from_this<Connection> {
     ndk::SpAIBinder ProxyForLocked(uint64_t id, const std::string& descriptor) REQUIRES(mutex_);
     Waiter* FindWaiterLocked(uint64_t id) const REQUIRES(mutex_);
     void RemoveWaiterLocked(uint64_t id) REQUIRES(mutex_);
+    // The `descriptors` go with the frame's first byte: copies of the parcel's, since the frame
+    // may wait in the queue after the parcel is gone.
     bool Send(FrameType type, uint32_t code, uint32_t flags, uint64_t id, uint64_t target,
               uint64_t parent, const AParcel* parcel, const std::vector<WireObject>& objects,
-              int descriptor = -1);
-    // Sends the start of a frame that carries `descriptor`, waiting (a bounded time) for the
-    // queue to empty and the socket to take a byte; lets send_mutex_ go while it waits.
-    bool SendFirstByteWithDescriptor(const iovec* iov, size_t* sent, int descriptor)
-        REQUIRES(send_mutex_);
+              std::vector<ndk::ScopedFileDescriptor> descriptors = {});
+    // Sends queued bytes until the socket is full or the queue is empty; false when the peer is
+    // gone.
+    bool SendPendingLocked() REQUIRES(send_mutex_);
     void SendReply(uint64_t id, binder_status_t status, const AParcel& reply);
     // Sends what the socket would not take at once, on a runtime thread, as the peer reads.
     void FlushPending();
@@ -153,6 +153,13 @@ class Connection : public std::enable_shared_from_this<Connection> {
     // new.
     std::vector<uint8_t> pending_out_ GUARDED_BY(send_mutex_);
     size_t pending_sent_ GUARDED_BY(send_mutex_) = 0;
+    // The descriptors of queued frames, in order, each to go with the first byte of its frame,
+    // which starts `at` bytes into pending_out_.
+    struct PendingDescriptors {
+        size_t at;
+        std::vector<ndk::ScopedFileDescriptor> descriptors;
+    };
+    std::deque<PendingDescriptors> pending_descriptors_ GUARDED_BY(send_mutex_);
     bool flushing_ GUARDED_BY(send_mutex_) = false;
     // Set once the peer let too much pile up; the connection is on its way out.
     bool send_refused_ GUARDED_BY(send_mutex_) = false;

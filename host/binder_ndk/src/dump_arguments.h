@@ -11,7 +11,8 @@
 
 namespace vyr_binder {
 
-// A dump request's arguments in its parcel: a count, then each as a string.
+// A dump request's arguments in its parcel, after its output descriptor: a count, then each as
+// a string.
 constexpr uint32_t kMaxDumpArguments = 256;
 
 binder_status_t WriteDumpArguments(AParcel* parcel, const char** args, uint32_t count);

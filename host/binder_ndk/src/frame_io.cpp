@@ -55,7 +55,7 @@ FrameBuffer::Result FrameBuffer::Check() const {
     std::memcpy(&header, buffer_.data() + begin_, sizeof(header));
     if (!ValidateHeader(header)) return Result::kMalformed;
     if (Available() < FrameSize(header)) return Result::kNoData;
-    // The descriptor came with the frame's first byte, so it is here by now.
+    // Descriptors come with their frame's first byte, so this frame's are here by now.
     return header.descriptor_count <= descriptors_.size() ? Result::kFrame : Result::kMalformed;
 }
 
@@ -85,7 +85,9 @@ FrameBuffer::Result FrameBuffer::Fill(int fd, bool wait) {
         const size_t room = buffer_.size() - end_;
         const size_t descriptors = descriptors_.size();
         ssize_t n = Receive(fd);
-        if (n > 0 && descriptors_.size() > kMaxReceivedDescriptors) return Result::kMalformed;
+        if (n > 0 && (lost_descriptors_ || descriptors_.size() > kMaxReceivedDescriptors)) {
+            return Result::kMalformed;
+        }
         if (n > 0) {
             end_ += static_cast<size_t>(n);
             // A read stops early at bytes that brought descriptors, with more behind them.
@@ -113,7 +115,7 @@ bool FrameBuffer::WaitReadable(int fd) {
 
 ssize_t FrameBuffer::Receive(int fd) {
     iovec iov{buffer_.data() + end_, buffer_.size() - end_};
-    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxReceivedDescriptors)];
+    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxDescriptorsPerFrame)];
     msghdr msg{};
     msg.msg_iov = &iov;
     msg.msg_iovlen = 1;
@@ -130,18 +132,16 @@ ssize_t FrameBuffer::Receive(int fd) {
             descriptors_.emplace_back(received);
         }
     }
-    // Descriptors the control buffer could not hold are lost: the stream no longer matches.
-    if ((msg.msg_flags & MSG_CTRUNC) != 0) {
-        descriptors_.resize(kMaxReceivedDescriptors + 1);
-    }
+    if ((msg.msg_flags & MSG_CTRUNC) != 0) lost_descriptors_ = true;
     return n;
 }
 
 void FrameBuffer::Take(Frame* frame) {
     std::memcpy(&frame->header, buffer_.data() + begin_, sizeof(FrameHeader));
-    frame->descriptor.set(-1);
-    if (frame->header.descriptor_count == 1) {
-        frame->descriptor = std::move(descriptors_.front());
+    // Check made sure that they are here.
+    frame->descriptors.clear();
+    for (uint32_t i = 0; i < frame->header.descriptor_count; ++i) {
+        frame->descriptors.push_back(std::move(descriptors_.front()));
         descriptors_.pop_front();
     }
     const uint8_t* data = buffer_.data() + begin_ + sizeof(FrameHeader);
@@ -156,8 +156,17 @@ void FrameBuffer::Take(Frame* frame) {
     }
 }
 
-bool SendSome(int fd, const iovec* iov, int count, size_t* sent, int descriptor) {
+void FrameBuffer::Clear() {
+    descriptors_.clear();
+    begin_ = end_ = 0;
+    Resize(0);
+}
+
+bool SendSome(int fd, const iovec* iov, int count, size_t* sent,
+              const std::vector<ndk::ScopedFileDescriptor>& descriptors) {
     *sent = 0;
+    // Callers keep to the limit; the control buffer is never overrun all the same.
+    if (descriptors.size() > kMaxDescriptorsPerFrame) return false;
     iovec rest[4];
     int first = 0;
     for (int i = 0; i < count; ++i) rest[i] = iov[i];
@@ -165,15 +174,19 @@ bool SendSome(int fd, const iovec* iov, int count, size_t* sent, int descriptor)
         msghdr msg{};
         msg.msg_iov = rest + first;
         msg.msg_iovlen = static_cast<size_t>(count - first);
-        alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int))];
-        if (descriptor >= 0 && *sent == 0) {
+        alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxDescriptorsPerFrame)];
+        if (!descriptors.empty() && *sent == 0) {
+            const size_t bytes = sizeof(int) * descriptors.size();
             msg.msg_control = control;
-            msg.msg_controllen = sizeof(control);
+            msg.msg_controllen = CMSG_SPACE(bytes);
             cmsghdr* c = CMSG_FIRSTHDR(&msg);
             c->cmsg_level = SOL_SOCKET;
             c->cmsg_type = SCM_RIGHTS;
-            c->cmsg_len = CMSG_LEN(sizeof(int));
-            std::memcpy(CMSG_DATA(c), &descriptor, sizeof(int));
+            c->cmsg_len = CMSG_LEN(bytes);
+            for (size_t i = 0; i < descriptors.size(); ++i) {
+                const int descriptor = descriptors[i].get();
+                std::memcpy(CMSG_DATA(c) + i * sizeof(int), &descriptor, sizeof(int));
+            }
         }
         ssize_t n = sendmsg(fd, &msg, MSG_NOSIGNAL | MSG_DONTWAIT);
         if (n < 0) {

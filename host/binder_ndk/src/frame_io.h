@@ -20,15 +20,20 @@ struct Frame {
     FrameHeader header;
     std::vector<uint8_t> data;
     std::vector<uint8_t> table;
-    // The descriptor that came with the frame, when its header announced one.
-    ndk::ScopedFileDescriptor descriptor;
+    // The descriptors that came with the frame, as many as its header announced, in the order of
+    // the sender's parcel.
+    std::vector<ndk::ScopedFileDescriptor> descriptors;
 };
 
 // Receive buffers of all connections together may hold at most this much; a connection whose
 // buffer would grow beyond it is dropped.
 constexpr size_t kMaxBufferedBytesPerProcess = 64u << 20;
-// Descriptors received and not yet taken by their frames; a peer that sends more is dropped.
-constexpr size_t kMaxReceivedDescriptors = 4;
+// Descriptors received and not yet taken by their frames; a peer that sends more is dropped. A
+// read brings those of one send at most (the kernel ends a read after bytes that brought
+// descriptors), and a connection reads only while no whole frame is buffered: what it holds is
+// the descriptors of the frame arriving and of the one behind it, whose first byte the same read
+// may have taken.
+constexpr size_t kMaxReceivedDescriptors = 2 * kMaxDescriptorsPerFrame;
 // Frames that a peer does not read at once wait in its connection, up to this much; a peer that
 // lets more pile up is dropped.
 constexpr size_t kMaxPendingSendBytes = 4u << 20;
@@ -54,6 +59,8 @@ class FrameBuffer {
     void Take(Frame* frame);
     // Whether the last read found nothing more in the socket.
     bool drained() const { return drained_; }
+    // Drops what is buffered, closing the descriptors that came with it.
+    void Clear();
 
   private:
     size_t Available() const { return end_ - begin_; }
@@ -69,6 +76,9 @@ class FrameBuffer {
     std::vector<uint8_t> buffer_;
     // In the order they arrived, which is the order of the frames that announced them.
     std::deque<ndk::ScopedFileDescriptor> descriptors_;
+    // A read brought more descriptors than it had room for; the kernel closed the rest, and the
+    // stream no longer matches its frames.
+    bool lost_descriptors_ = false;
     size_t begin_ = 0;
     size_t end_ = 0;
     bool drained_ = true;
@@ -78,8 +88,10 @@ class FrameBuffer {
 size_t BufferedBytes();
 
 // Sends as much of the `count` (at most 4) buffers as the socket takes without waiting, and
-// tells how many bytes that was; false when the peer is gone. A `descriptor` (not -1) goes with
-// the first byte sent.
-bool SendSome(int fd, const iovec* iov, int count, size_t* sent, int descriptor = -1);
+// tells how many bytes that was; false when the peer is gone. The `descriptors` (at most
+// kMaxDescriptorsPerFrame) go with the first byte sent, so with nothing sent they did not go
+// either.
+bool SendSome(int fd, const iovec* iov, int count, size_t* sent,
+              const std::vector<ndk::ScopedFileDescriptor>& descriptors = {});
 
 }  // namespace vyr_binder

@@ -4,10 +4,12 @@
 #include "parcel.h"
 
 #include <android/binder_parcel_utils.h>
+#include <fcntl.h>
 
 #include <cstring>
 #include <limits>
 #include <string>
+#include <utility>
 
 #include "binder.h"
 #include "status.h"
@@ -22,6 +24,8 @@ constexpr size_t Padded(size_t size) {
 }
 
 enum : int32_t { kNullBinder = 0, kBinder = 1 };
+// A descriptor's entry in the data: the marker, then for a descriptor its index in the table.
+enum : int32_t { kNullDescriptor = 0, kDescriptor = 1 };
 
 // Structurally valid UTF-8, without overlong forms or surrogates.
 bool IsValidUtf8(const uint8_t* s, size_t n) {
@@ -140,6 +144,7 @@ binder_status_t AParcel::Read(void* bytes, size_t size) const {
 void AParcel::Clear() {
     data.clear();
     objects.clear();
+    fds.clear();
     pos = 0;
 }
 
@@ -209,17 +214,40 @@ binder_status_t AParcel_readStrongBinder(const AParcel* parcel, AIBinder** binde
 
 binder_status_t AParcel_writeParcelFileDescriptor(AParcel* parcel, int fd) {
     if (parcel == nullptr) return STATUS_UNEXPECTED_NULL;
-    if (fd < 0) return WriteValue<int32_t>(parcel, 0);
-    return STATUS_FDS_NOT_ALLOWED;
+    if (fd == -1) return WriteValue<int32_t>(parcel, kNullDescriptor);
+    // As the platform's NDK answers other negative values (parcel.cpp), and a descriptor that
+    // cannot be duplicated (libbinder's -errno, which the NDK prunes to this).
+    if (fd < 0) return STATUS_UNKNOWN_ERROR;
+    // The caller keeps its own descriptor: the parcel owns a duplicate, as libbinder's
+    // writeDupParcelFileDescriptor makes one.
+    ndk::ScopedFileDescriptor copy(fcntl(fd, F_DUPFD_CLOEXEC, 0));
+    if (copy.get() < 0) return STATUS_UNKNOWN_ERROR;
+    const int32_t entry[2] = {kDescriptor, static_cast<int32_t>(parcel->fds.size())};
+    binder_status_t status = parcel->Write(entry, sizeof(entry));
+    if (status != STATUS_OK) return status;
+    parcel->fds.push_back(std::move(copy));
+    return STATUS_OK;
 }
 
 binder_status_t AParcel_readParcelFileDescriptor(const AParcel* parcel, int* fd) {
-    int32_t present;
-    binder_status_t status = ReadValue(parcel, &present);
+    if (parcel == nullptr || fd == nullptr) return STATUS_UNEXPECTED_NULL;
+    int32_t marker;
+    binder_status_t status = parcel->Read(&marker, sizeof(marker));
     if (status != STATUS_OK) return status;
-    if (fd == nullptr) return STATUS_UNEXPECTED_NULL;
-    if (present != 0) return STATUS_FDS_NOT_ALLOWED;
-    *fd = -1;
+    if (marker == kNullDescriptor) {
+        *fd = -1;
+        return STATUS_OK;
+    }
+    if (marker != kDescriptor) return STATUS_BAD_VALUE;
+    int32_t index;
+    status = parcel->Read(&index, sizeof(index));
+    if (status != STATUS_OK) return status;
+    if (index < 0 || static_cast<size_t>(index) >= parcel->fds.size()) return STATUS_BAD_VALUE;
+    // Every read hands the caller a descriptor of its own to close, as libbinder's
+    // readUniqueParcelFileDescriptor does; the parcel keeps its copy.
+    const int copy = fcntl(parcel->fds[static_cast<size_t>(index)].get(), F_DUPFD_CLOEXEC, 0);
+    if (copy < 0) return STATUS_BAD_VALUE;
+    *fd = copy;
     return STATUS_OK;
 }
 

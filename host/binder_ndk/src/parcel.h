@@ -30,6 +30,9 @@ struct AParcel {
     // Reads move the position of a const parcel, as on the platform.
     mutable size_t pos = 0;
     std::vector<vyr_binder::ParcelObject> objects;
+    // Duplicates of the descriptors written into the parcel, which it owns and closes; the data
+    // holds each one's index here.
+    std::vector<ndk::ScopedFileDescriptor> fds;
     // The binder a transaction parcel was prepared for; null for replies and free parcels.
     ndk::SpAIBinder target;
 

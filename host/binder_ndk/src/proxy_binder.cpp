@@ -51,10 +51,11 @@ binder_status_t ProxyBinder::Dump(int fd, const char** args, uint32_t num_args) 
     if (!IsAlive()) return STATUS_DEAD_OBJECT;
     if (fd < 0 || fcntl(fd, F_GETFD) < 0) return STATUS_BAD_VALUE;
     AParcel in;
-    binder_status_t status = WriteDumpArguments(&in, args, num_args);
+    binder_status_t status = AParcel_writeParcelFileDescriptor(&in, fd);
+    if (status == STATUS_OK) status = WriteDumpArguments(&in, args, num_args);
     if (status != STATUS_OK) return status;
     AParcel out;
-    return connection_->Transact(remote_id_, kDumpTransaction, in, &out, 0, fd);
+    return connection_->Transact(remote_id_, kDumpTransaction, in, &out, 0);
 }
 
 binder_status_t ProxyBinder::LinkToDeath(const DeathLink& link) {

@@ -22,7 +22,9 @@ constexpr size_t Padded(size_t size) {
 }  // namespace
 
 bool ValidateHeader(const FrameHeader& header) {
-    if (header.magic != kFrameMagic || header.descriptor_count > 1) return false;
+    if (header.magic != kFrameMagic || header.descriptor_count > kMaxDescriptorsPerFrame) {
+        return false;
+    }
     if (header.data_size > kMaxTransactionBytes || header.object_count > kMaxObjects) return false;
     size_t max_table =
         static_cast<size_t>(header.object_count) * (sizeof(ObjectEntry) + kMaxDescriptorBytes);
@@ -33,7 +35,7 @@ bool ValidateHeader(const FrameHeader& header) {
     switch (static_cast<FrameType>(header.type)) {
         case FrameType::kHello:
         case FrameType::kRelease:
-            return header.object_count == 0;
+            return header.object_count == 0 && header.descriptor_count == 0;
         case FrameType::kTransaction:
         case FrameType::kReply:
             return true;

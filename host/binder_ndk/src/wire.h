@@ -26,7 +26,8 @@ struct FrameHeader {
     uint32_t data_size;
     uint32_t object_count;
     uint32_t table_size;
-    // File descriptors sent with the frame's first byte (SCM_RIGHTS): 0, or 1 for a dump request.
+    // File descriptors sent with the frame's first byte (SCM_RIGHTS): the parcel's, in the order
+    // of its table.
     uint32_t descriptor_count;
     uint64_t transaction_id;
     uint64_t target;
@@ -41,6 +42,9 @@ constexpr uint32_t kFrameMagic = 0x42525956;  // "VYRB"
 constexpr size_t kMaxTransactionBytes = 1u << 20;
 constexpr size_t kMaxDescriptorBytes = 1024;
 constexpr size_t kMaxObjects = kMaxTransactionBytes / 8;
+// Descriptors one frame may carry. A host limit: a device's driver takes as many as the
+// receiver may open. A parcel with more is refused with STATUS_FAILED_TRANSACTION.
+constexpr size_t kMaxDescriptorsPerFrame = 64;
 
 enum class ObjectKind : uint32_t {
     kSenderObject = 1,    // implemented by the sender; carries its descriptor

@@ -53,8 +53,12 @@ binder_status_t AParcel_writeStrongBinder(AParcel* parcel, AIBinder* binder) __I
 // *binder receives a strong reference, or null when a null binder was written.
 binder_status_t AParcel_readStrongBinder(const AParcel* parcel, AIBinder** binder)
     __INTRODUCED_IN(29);
-// File descriptors cannot cross this runtime: both give STATUS_FDS_NOT_ALLOWED for a valid fd.
+// The parcel keeps a duplicate of `fd` (F_DUPFD_CLOEXEC) and closes it when deleted or reset; the
+// caller keeps its own. -1 writes a null ParcelFileDescriptor; other negative values and
+// descriptors that cannot be duplicated give STATUS_UNKNOWN_ERROR, as on a device.
 binder_status_t AParcel_writeParcelFileDescriptor(AParcel* parcel, int fd) __INTRODUCED_IN(29);
+// *fd receives a new duplicate that the caller owns and must close (each read gives another),
+// or -1 for a null one. An entry that names no descriptor of the parcel gives STATUS_BAD_VALUE.
 binder_status_t AParcel_readParcelFileDescriptor(const AParcel* parcel, int* fd) __INTRODUCED_IN(29);
 
 binder_status_t AParcel_writeStatusHeader(AParcel* parcel, const AStatus* status)
