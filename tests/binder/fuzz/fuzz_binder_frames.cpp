@@ -3,11 +3,14 @@
 
 // Feeds arbitrary bytes to the runtime's decoders. The first byte picks the target:
 //   0: frame headers and object tables
-//   1: a byte stream from a peer, through a real connection
+//   1: a byte stream from a peer, through a real connection, with descriptors on its first byte
+//      (as many as its first byte says, modulo 4)
 //   2: a transaction to a local IVYRService (the generated unmarshalling and parcel reads)
-//   3: a parcel read value by value, the next byte choosing each read
+//   3: a parcel read value by value, the next byte choosing each read; the parcel holds two
+//      descriptors that its entries may name
 #include <aidl/android/vyr/BnVYRService.h>
 #include <android/binder_parcel_utils.h>
+#include <poll.h>
 #include <sys/mman.h>
 #include <sys/socket.h>
 #include <unistd.h>
@@ -20,6 +23,7 @@
 #include <vector>
 
 #include "connection.h"
+#include "frame_io.h"
 #include "looper.h"
 #include "parcel.h"
 #include "process_state.h"
@@ -79,7 +83,20 @@ void FuzzWire(const uint8_t* data, size_t size) {
                               &objects);
 }
 
+// Descriptors to send or to hold in a parcel: each reads as an empty file.
+std::vector<ndk::ScopedFileDescriptor> Descriptors(size_t count) {
+    std::vector<ndk::ScopedFileDescriptor> descriptors;
+    for (size_t i = 0; i < count; ++i) {
+        descriptors.emplace_back(memfd_create("fuzz.descriptor", MFD_CLOEXEC));
+    }
+    return descriptors;
+}
+
 void FuzzConnection(const uint8_t* data, size_t size) {
+    if (size < 1) return;
+    const std::vector<ndk::ScopedFileDescriptor> descriptors = Descriptors(data[0] % 4);
+    ++data;
+    --size;
     int fds[2];
     if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, fds) != 0) return;
     vyr_binder::Looper& looper = vyr_binder::ProcessState::Get().looper();
@@ -90,9 +107,15 @@ void FuzzConnection(const uint8_t* data, size_t size) {
     connection.reset();
     size_t sent = 0;
     while (sent < size) {
-        ssize_t n = send(fds[1], data + sent, size - sent, MSG_NOSIGNAL);
-        if (n <= 0) break;
-        sent += static_cast<size_t>(n);
+        iovec rest{const_cast<uint8_t*>(data) + sent, size - sent};
+        size_t taken = 0;
+        // Blocking sends: the runtime reads as it goes.
+        pollfd writable{fds[1], POLLOUT, 0};
+        poll(&writable, 1, -1);
+        const bool more = sent == 0 ? vyr_binder::SendSome(fds[1], &rest, 1, &taken, descriptors)
+                                    : vyr_binder::SendSome(fds[1], &rest, 1, &taken);
+        if (!more) break;
+        sent += taken;
     }
     shutdown(fds[1], SHUT_WR);
     // Whatever the runtime answers is read and dropped until it closes its end.
@@ -120,9 +143,10 @@ void FuzzReads(const uint8_t* data, size_t size) {
     size_t split = data[0] % (size);
     ndk::ScopedAParcel parcel(AParcel_create());
     parcel.get()->data.assign(data + split, data + size);
+    parcel.get()->fds = Descriptors(2);
     const AParcel* p = parcel.get();
     for (size_t i = 1; i < split; ++i) {
-        switch (data[i] % 14) {
+        switch (data[i] % 15) {
             case 0: {
                 int32_t v;
                 AParcel_readInt32(p, &v);
@@ -186,6 +210,11 @@ void FuzzReads(const uint8_t* data, size_t size) {
             case 12:
                 AParcel_setDataPosition(p, static_cast<int32_t>(data[i]) * 4);
                 break;
+            case 13: {
+                ndk::ScopedFileDescriptor v;
+                ndk::AParcel_readNullableParcelFileDescriptor(p, &v);
+                break;
+            }
             default: {
                 std::optional<std::vector<int64_t>> v;
                 ndk::AParcel_readVector(p, &v);
