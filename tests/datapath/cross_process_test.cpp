@@ -12,6 +12,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <cstdio>
 #include <cstdlib>
 #include <fstream>
 #include <iostream>
@@ -28,6 +29,7 @@
 #include "service_dump.h"
 #include "service_process.h"
 #include "shared_service_test.h"
+#include "test_files.h"
 
 namespace vyr_test::datapath {
 namespace {
@@ -207,6 +209,60 @@ TEST_F(RealServiceTest, InterruptedStreamDisablesAndClosesItsHandle) {
     EXPECT_TRUE(ExitedWith(stream->Wait(kWait), 0));
     EXPECT_EQ(PollResult(handle), -22) << "the stream left its handle open";
     EXPECT_TRUE(process_->WaitForSensorState("range.enabled", "0", kWait));
+}
+
+// vyrctl ring: the samples that the service writes into the shared ring, read in order from the
+// ring's descriptor, as stream --json lines; the handle released on Ctrl-C.
+TEST_F(RealServiceTest, RingPrintsEachSampleInOrderAndReleasesItsHandle) {
+    auto ring = Vyrctl({"--timeout", "10", "ring", "range", "--period", "33", "--json"});
+    const std::string errors = process_->dir() + "/vyrctl-" + std::to_string(clients_) + ".log";
+    std::vector<std::string> lines;
+    while (lines.size() < 6) {
+        std::optional<std::string> line = ring->ReadLine(kWait);
+        ASSERT_TRUE(line) << ReadFile(errors);
+        lines.push_back(*line);
+    }
+    const int32_t handle = static_cast<int32_t>(JsonInt(lines[0], "handle"));
+    EXPECT_EQ(process_->LogCount("EnableRing handle " + std::to_string(handle) + ", mode 3"), 1u);
+    int64_t previous_frame = INT64_MIN;
+    for (const std::string& line : lines) {
+        const int64_t read = JsonInt(line, "boottime_ns");
+        EXPECT_GT(read, 0) << line;
+        EXPECT_GE(JsonInt(line, "received_boottime_ns"), read)
+            << "read before it was written: " << line;
+        EXPECT_EQ(JsonArrayLength(line, "data"), 10u + 11u * JsonInt(line, "zone_count")) << line;
+        const int64_t frame = JsonInt(line, "frame_number");
+        EXPECT_GT(frame, previous_frame) << "a sample read twice: " << line;
+        previous_frame = frame;
+    }
+    ring->Signal(SIGINT);
+    EXPECT_TRUE(ExitedWith(ring->Wait(kWait), 0));
+    EXPECT_EQ(PollResult(handle), -22) << "the ring left its handle open";
+    const std::string log = ReadFile(errors);
+    EXPECT_NE(log.find("handle " + std::to_string(handle) + " disabled and closed"), std::string::npos)
+        << log;
+    EXPECT_EQ(log.find("gap:"), std::string::npos) << log;
+}
+
+// The readable lines carry each sample's seq: consecutive, as nothing was overwritten unread.
+TEST_F(RealServiceTest, RingEndsAfterItsSecondsHavingReadEverySample) {
+    auto ring = Vyrctl({"--timeout", "10", "ring", "range", "--period", "50", "--seconds", "1"});
+    const std::vector<std::string> lines = StreamLines(ring.get());
+    EXPECT_TRUE(ExitedWith(ring->Wait(kWait), 0));
+    ASSERT_GE(lines.size(), 5u);
+    uint64_t previous = 0;
+    for (const std::string& line : lines) {
+        unsigned long long seq = 0;
+        double age_ms = -1;
+        const size_t at = line.rfind(" seq=");
+        ASSERT_NE(at, std::string::npos) << line;
+        ASSERT_EQ(sscanf(line.c_str() + at, " seq=%llu age=%lf ms", &seq, &age_ms), 2) << line;
+        EXPECT_GE(age_ms, 0) << line;
+        if (previous != 0) {
+            EXPECT_EQ(seq, previous + 1) << line;
+        }
+        previous = seq;
+    }
 }
 
 TEST_F(RealServiceTest, RangeStreamGoesOnWhenLowPowerIsRefused) {
