@@ -23,9 +23,14 @@
 //                                      that callback: it never returns from its first batch;
 //                                      prints "handle <h>" once inside it and waits to be killed
 //   vyr_doubles_service batch <name>   the same with a callback that takes each batch at once
+//   vyr_doubles_service ring <name>    opens a range handle, enables it on the sample ring at
+//                                      1 ms, maps the ring, prints "handle <h>" and waits to be
+//                                      killed
 
 #include <android/binder_manager.h>
 #include <android/binder_process.h>
+#include <sys/mman.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <chrono>
@@ -104,6 +109,26 @@ int Client(const char* name) {
     auto callback = ndk::SharedRefBase::make<vyr_test::RecordingCallback>();
     if (int failed = OpenWithCallback(*service, callback, &handle)) return failed;
     if (!service->Enable(handle, 20, &result).isOk() || result != 0) return 5;
+    printf("handle %d\n", handle);
+    fflush(stdout);
+    for (;;) pause();
+}
+
+int Ring(const char* name) {
+    std::shared_ptr<IVYRService> service = Connect(name);
+    if (service == nullptr) return 2;
+    int32_t handle = 0;
+    int32_t result = 0;
+    if (!service->Open(kRange, &handle).isOk() || handle <= 0) return 3;
+    ndk::ScopedFileDescriptor ring;
+    if (!service->EnableRing(handle, 1, &ring, &result).isOk() || result != 0) return 5;
+    struct stat st {};
+    if (fstat(ring.get(), &st) != 0) return 6;
+    // Held mapped until the process is killed, as a camera pipeline holds it.
+    if (mmap(nullptr, static_cast<size_t>(st.st_size), PROT_READ, MAP_SHARED, ring.get(), 0) ==
+        MAP_FAILED) {
+        return 7;
+    }
     printf("handle %d\n", handle);
     fflush(stdout);
     for (;;) pause();
@@ -210,6 +235,7 @@ int main(int argc, char** argv) {
     if (argc == 3 && strcmp(argv[1], "serve") == 0) return Serve(argv[2]);
     if (argc == 3 && strcmp(argv[1], "client") == 0) return Client(argv[2]);
     if (argc == 3 && strcmp(argv[1], "stuck") == 0) return Stuck(argv[2]);
+    if (argc == 3 && strcmp(argv[1], "ring") == 0) return Ring(argv[2]);
     if (argc == 3 && strcmp(argv[1], "stuck-batch") == 0) {
         auto callback = ndk::SharedRefBase::make<StuckCallback>();
         return Batches(argv[2], callback, [callback] { callback->WaitUntilCalled(); });
@@ -224,7 +250,8 @@ int main(int argc, char** argv) {
         return Shared(argv[2], strcmp(argv[3], "first") == 0);
     }
     fprintf(stderr,
-            "usage: %s serve|client|stuck|stuck-batch|batch <name> | shared <name> first|second\n",
+            "usage: %s serve|client|stuck|stuck-batch|batch|ring <name> | shared <name> "
+            "first|second\n",
             argv[0]);
     return 64;
 }

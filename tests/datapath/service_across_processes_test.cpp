@@ -15,6 +15,7 @@
 #include <stdlib.h>
 #include <sys/wait.h>
 #include <unistd.h>
+#include <vyr/sample_ring_reader.h>
 #include <vyr/sensor_client.h>
 
 #include <atomic>
@@ -127,6 +128,71 @@ TEST_F(ServiceAcrossProcessesTest, TheDeathOfAClientReleasesItsHandle) {
     client.Signal(SIGKILL);
     ASSERT_TRUE(client.Wait(kDeadline));
     EXPECT_TRUE(Eventually([&] { return Poll(handle) == -EINVAL; })) << "the handle outlived it";
+}
+
+// A ring client reads every sample the service stores, in order, from shared memory: the frames
+// of the doubles are numbered by their time, one apart.
+TEST_F(ServiceAcrossProcessesTest, ARingClientReadsEverySampleInOrderWithNoCallPerSample) {
+    const int32_t handle = OpenRange();
+    ndk::ScopedFileDescriptor fd;
+    int32_t result = -1;
+    ASSERT_TRUE(service_->EnableRing(handle, 1, &fd, &result).isOk());
+    ASSERT_EQ(result, 0);
+    std::string error;
+    std::unique_ptr<vyr::SampleRingReader> ring = vyr::SampleRingReader::Map(std::move(fd), &error);
+    ASSERT_NE(ring, nullptr) << error;
+    EXPECT_EQ(ring->mode(), kRangeMode);
+    vyr::RingSample sample;
+    const auto deadline = std::chrono::steady_clock::now() + kDeadline;
+    ASSERT_EQ(ring->WaitNewer(0, deadline, &sample), vyr::SampleRingReader::WaitResult::kOk);
+    uint64_t seq = sample.seq;
+    int64_t timestamp = sample.timestamp;
+    for (int i = 0; i < 200; ++i) {
+        ASSERT_EQ(ring->WaitNewer(seq, deadline, &sample), vyr::SampleRingReader::WaitResult::kOk);
+        EXPECT_EQ(sample.seq, seq + 1) << "records were overwritten before they were read";
+        EXPECT_EQ(sample.timestamp, timestamp + 1) << "a sample went missing at seq " << sample.seq;
+        EXPECT_EQ(sample.data_count, 21u) << "10 header values and one zone's 11";
+        seq = sample.seq;
+        timestamp = sample.timestamp;
+    }
+    ASSERT_TRUE(service_->Disable(handle).isOk());
+    ASSERT_TRUE(service_->Close(handle).isOk());
+}
+
+// A client that dies with the ring mapped is released as any other, and the ring is written no
+// more, though the mode samples on for a polling client.
+TEST_F(ServiceAcrossProcessesTest, TheDeathOfARingClientReleasesItAndEndsTheWriting) {
+    ChildProcess client({DoublesService(), "ring", name_}, {}, dir_ + "/client.log");
+    std::optional<std::string> line = client.ReadLineStartingWith("handle ", kDeadline);
+    ASSERT_TRUE(line) << "the client never enabled";
+    const int32_t handle = atoi(line->c_str() + 7);
+    ASSERT_GT(handle, 0);
+    // This process's view of the same ring, through a handle of its own enabled and disabled.
+    const int32_t viewer = OpenRange();
+    ndk::ScopedFileDescriptor fd;
+    int32_t result = -1;
+    ASSERT_TRUE(service_->EnableRing(viewer, 1, &fd, &result).isOk());
+    ASSERT_EQ(result, 0);
+    ASSERT_TRUE(service_->Disable(viewer).isOk());
+    std::string error;
+    std::unique_ptr<vyr::SampleRingReader> ring = vyr::SampleRingReader::Map(std::move(fd), &error);
+    ASSERT_NE(ring, nullptr) << error;
+    const uint64_t before = ring->LastSeq();
+    EXPECT_TRUE(Eventually([&] { return ring->LastSeq() > before + 10; })) << "not written";
+
+    const int32_t poller = OpenRange();
+    EnableAt(poller, 1);
+    client.Signal(SIGKILL);
+    ASSERT_TRUE(client.Wait(kDeadline));
+    EXPECT_TRUE(Eventually([&] { return Poll(handle) == -EINVAL; })) << "the handle outlived it";
+    const uint64_t frozen = ring->LastSeq();
+    // Samples go on being stored for the poller: fresh ones come, the ring stays as it was.
+    int fresh = 0;
+    EXPECT_TRUE(Eventually([&] { return Poll(poller) == 0 && ++fresh >= 20; }));
+    EXPECT_EQ(ring->LastSeq(), frozen) << "written for a dead client";
+    ASSERT_TRUE(service_->Disable(poller).isOk());
+    ASSERT_TRUE(service_->Close(poller).isOk());
+    ASSERT_TRUE(service_->Close(viewer).isOk());
 }
 
 // One callback object set on two handles: its process's death releases both, whichever handle's
