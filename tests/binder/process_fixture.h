@@ -12,6 +12,7 @@
 
 #include <chrono>
 #include <condition_variable>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <string>
@@ -20,6 +21,7 @@
 #include <vector>
 
 #include "binder_test_env.h"
+#include "wait_until.h"
 
 namespace vyr_test::binder {
 
@@ -41,14 +43,9 @@ class DeathLog {
     std::vector<std::pair<void*, std::thread::id>> notices_;
 };
 
-template <typename Predicate>
-bool Eventually(Predicate predicate, std::chrono::milliseconds timeout = 10s) {
-    auto deadline = std::chrono::steady_clock::now() + timeout;
-    while (!predicate()) {
-        if (std::chrono::steady_clock::now() > deadline) return false;
-        std::this_thread::sleep_for(5ms);
-    }
-    return true;
+inline bool Eventually(const std::function<bool()>& predicate,
+                       std::chrono::milliseconds timeout = 10s) {
+    return vyr_test::WaitUntil(predicate, timeout);
 }
 
 class CrossProcessTest : public ::testing::Test {

@@ -11,12 +11,14 @@
 
 #include <chrono>
 #include <condition_variable>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <string>
 #include <thread>
 
 #include "child_process.h"
+#include "wait_until.h"
 
 namespace vyr_test::datapath {
 
@@ -24,14 +26,8 @@ constexpr int32_t kRangeMode = 3;
 constexpr std::chrono::milliseconds kDeadline{10000};
 
 // Whether `predicate` holds within kDeadline.
-template <typename Predicate>
-bool Eventually(Predicate predicate) {
-    const auto deadline = std::chrono::steady_clock::now() + kDeadline;
-    while (!predicate()) {
-        if (std::chrono::steady_clock::now() > deadline) return false;
-        std::this_thread::sleep_for(std::chrono::milliseconds(5));
-    }
-    return true;
+inline bool Eventually(const std::function<bool()>& predicate) {
+    return WaitUntil(predicate, kDeadline);
 }
 
 // Opened once; waited for with a deadline.
