@@ -21,8 +21,10 @@ bool ParseFlags(int argc, char** argv, const std::vector<Flag>& flags) {
         }
         if (int* const* number = std::get_if<int*>(&flag->value)) {
             **number = atoi(argv[i + 1]);
+        } else if (double* const* real = std::get_if<double*>(&flag->value)) {
+            **real = atof(argv[i + 1]);
         } else {
-            *std::get<double*>(flag->value) = atof(argv[i + 1]);
+            *std::get<std::string*>(flag->value) = argv[i + 1];
         }
     }
     return true;

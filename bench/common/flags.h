@@ -3,8 +3,9 @@
 
 #pragma once
 
-// The "--name value" options of the floor benchmarks.
+// The "--name value" options of the benchmark programs.
 
+#include <string>
 #include <variant>
 #include <vector>
 
@@ -13,7 +14,7 @@ namespace vyr_bench {
 // One option and the field that its value goes into.
 struct Flag {
     const char* name;
-    std::variant<int*, double*> value;
+    std::variant<int*, double*, std::string*> value;
 };
 
 // Reads "--name value" pairs into the fields of `flags`; a name left without a value is ignored.
