@@ -13,6 +13,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cinttypes>
+#include <climits>
 #include <cstdio>
 #include <cstring>
 #include <limits>
@@ -256,6 +257,10 @@ SampleRingReader::WaitResult SampleRingReader::WaitNewer(
             if (errno == EINTR) return WaitResult::kInterrupted;
             // EAGAIN: the word changed before the sleep; ETIMEDOUT: looked at above.
             if (errno != EAGAIN && errno != ETIMEDOUT) return WaitResult::kFailed;
+        } else if (__atomic_load_n(word, __ATOMIC_ACQUIRE) != seen) {
+            // Woken for a new record, maybe as the one waiter the writer wakes: this reader wakes
+            // the others (the layout's protocol), so that the writer's cost stays one wake-up.
+            syscall(SYS_futex, word, FUTEX_WAKE, INT_MAX, nullptr, nullptr, 0);
         }
     }
 }

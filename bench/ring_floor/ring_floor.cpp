@@ -4,8 +4,8 @@
 // The floor of a ring sample's age when a waiting reader in another process sees it: the bare
 // cross-process futex wake that the sample ring uses, with nothing else in it. A writer stamps a
 // word of shared memory (a memfd, as the ring's) with CLOCK_BOOTTIME every period, bumps the
-// futex word and wakes every waiter; N reader processes sleep on the word and note the age of
-// each stamp they see.
+// futex word and wakes one waiter, which wakes the others; N reader processes sleep on the word
+// and note the age of each stamp they see.
 //
 //   bench_ring_floor [--readers N] [--period-ms P] [--seconds S]
 //
@@ -59,9 +59,11 @@ long Futex(uint32_t* word, int op, uint32_t value, const timespec* timeout) {
     uint32_t seen = __atomic_load_n(&shared->futex, __ATOMIC_ACQUIRE);
     const timespec second{1, 0};
     while (__atomic_load_n(&shared->stop, __ATOMIC_ACQUIRE) == 0) {
-        Futex(&shared->futex, FUTEX_WAIT, seen, &second);
+        const long woken = Futex(&shared->futex, FUTEX_WAIT, seen, &second);
         const uint32_t now = __atomic_load_n(&shared->futex, __ATOMIC_ACQUIRE);
         if (now == seen) continue;
+        // The ring's protocol: the writer wakes one reader, which wakes the others.
+        if (woken == 0) Futex(&shared->futex, FUTEX_WAKE, INT_MAX, nullptr);
         const int64_t read_at = BootTimeNs();
         seen = now;
         const int64_t stamp = __atomic_load_n(&shared->stamp, __ATOMIC_RELAXED);
@@ -121,7 +123,7 @@ int main(int argc, char** argv) {
         next += period;
         __atomic_store_n(&shared->stamp, BootTimeNs(), __ATOMIC_RELAXED);
         __atomic_add_fetch(&shared->futex, 1u, __ATOMIC_RELEASE);
-        Futex(&shared->futex, FUTEX_WAKE, INT_MAX, nullptr);
+        Futex(&shared->futex, FUTEX_WAKE, 1, nullptr);
     }
     __atomic_store_n(&shared->stop, 1u, __ATOMIC_RELEASE);
     __atomic_add_fetch(&shared->futex, 1u, __ATOMIC_RELEASE);

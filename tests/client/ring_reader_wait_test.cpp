@@ -18,8 +18,10 @@
 #include <atomic>
 #include <chrono>
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <thread>
+#include <vector>
 
 #include "ring_fixture.h"
 #include "test_files.h"
@@ -133,6 +135,25 @@ TEST(RingWaitTest, AWriteWakesASleepingReader) {
     EXPECT_EQ(waiter.sample().seq, 2u);
     EXPECT_EQ(waiter.sample().boottime_ns, 200);
     EXPECT_LT(waiter.took(), kWakeSlack);
+}
+
+// The writer wakes one waiter only, so that its cost does not grow with the readers; the woken
+// reader wakes the others.
+TEST(RingWaitTest, OneWriteWakesEverySleepingReader) {
+    RingFixture fixture(8);
+    ASSERT_TRUE(fixture.ready());
+    fixture.Write(100);
+    std::vector<std::unique_ptr<Waiter>> waiters;
+    for (int i = 0; i < 5; ++i) {
+        waiters.push_back(std::make_unique<Waiter>(fixture.reader(), 1, kLong));
+    }
+    for (auto& waiter : waiters) ASSERT_TRUE(waiter->Asleep());
+    fixture.Write(200);
+    for (auto& waiter : waiters) {
+        ASSERT_EQ(waiter->Join(), WaitResult::kOk);
+        EXPECT_EQ(waiter->sample().seq, 2u);
+        EXPECT_LT(waiter->took(), kWakeSlack) << "woken only by its deadline";
+    }
 }
 
 TEST(RingWaitTest, TheDeadlineEndsAWaitForNothing) {

@@ -9,7 +9,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <climits>
 #include <cstring>
 
 namespace android {
@@ -44,8 +43,9 @@ void SampleRing::Write(const aidl::android::vyr::Event& event) {
         static_cast<uint32_t>(std::min<size_t>(event.data.size(), VYR_RING_DATA_CAPACITY));
     std::copy_n(event.data.begin(), record.data_count, record.data);
     vyr_ring_write_record(header_, &record);
-    // Not private: the waiters are other processes mapping the same memory.
-    syscall(SYS_futex, &header_->futex, FUTEX_WAKE, INT_MAX, nullptr, nullptr, 0);
+    // One waiter, which wakes the others: the cost here does not grow with the readers. Not
+    // private: the waiters are other processes mapping the same memory.
+    syscall(SYS_futex, &header_->futex, FUTEX_WAKE, 1, nullptr, nullptr, 0);
 }
 
 ndk::ScopedFileDescriptor SampleRing::ReaderFd() const {

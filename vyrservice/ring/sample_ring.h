@@ -25,8 +25,9 @@ class SampleRing {
     // memory cannot be made.
     static std::unique_ptr<SampleRing> Create(int32_t mode, uint32_t capacity, std::string* error);
 
-    // Stores `event` as the next record and wakes every reader waiting for one. Never waits: a
-    // reader that is slow, asleep or gone costs nothing here. One thread at a time.
+    // Stores `event` as the next record and wakes one reader waiting for one, which wakes the
+    // others. Never waits: a reader that is slow, asleep or gone costs nothing here. One thread at
+    // a time.
     void Write(const aidl::android::vyr::Event& event);
     // A descriptor of the ring for a client, read-only; -1 with errno set when none can be made.
     ndk::ScopedFileDescriptor ReaderFd() const;

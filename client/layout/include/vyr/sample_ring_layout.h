@@ -28,10 +28,14 @@
 // 32 bits at a time in records, so readers and the writer never race in the language's sense.
 //
 // Waiting: after each record the writer stores last_seq (release), then `futex` (the low 32
-// bits of last_seq, release), and wakes every waiter on `futex` (FUTEX_WAKE, not private: the
-// memory is shared between processes). A reader that has seen seq s loads futex, checks that
-// last_seq is still s, and sleeps with FUTEX_WAIT(futex, the loaded value); the writer never
-// waits for a reader, and a reader that never reads costs the writer nothing.
+// bits of last_seq, release), and wakes one waiter on `futex` (FUTEX_WAKE of 1, not private:
+// the memory is shared between processes). A reader that has seen seq s loads futex, checks
+// that last_seq is still s, and sleeps with FUTEX_WAIT(futex, the loaded value). A reader woken
+// from that sleep (the call returned 0) that finds futex changed wakes every other waiter
+// (FUTEX_WAKE of INT_MAX; a wake needs no write access), so that the writer's cost stays one
+// wake-up however many readers wait, and the readers share the rest. The writer never waits for
+// a reader, and a reader that never reads costs the writer nothing. A reader killed between its
+// wake-up and its own wake leaves the others asleep until the next record or their deadline.
 
 #ifndef VYR_SAMPLE_RING_LAYOUT_H
 #define VYR_SAMPLE_RING_LAYOUT_H
