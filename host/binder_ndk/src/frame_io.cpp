@@ -115,7 +115,7 @@ bool FrameBuffer::WaitReadable(int fd) {
 
 ssize_t FrameBuffer::Receive(int fd) {
     iovec iov{buffer_.data() + end_, buffer_.size() - end_};
-    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxDescriptorsPerFrame)];
+    alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxDescriptorsPerMessage)];
     msghdr msg{};
     msg.msg_iov = &iov;
     msg.msg_iovlen = 1;
@@ -174,7 +174,7 @@ bool SendSome(int fd, const iovec* iov, int count, size_t* sent,
         msghdr msg{};
         msg.msg_iov = rest + first;
         msg.msg_iovlen = static_cast<size_t>(count - first);
-        alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxDescriptorsPerFrame)];
+        alignas(cmsghdr) char control[CMSG_SPACE(sizeof(int) * kMaxDescriptorsPerMessage)];
         if (!descriptors.empty() && *sent == 0) {
             const size_t bytes = sizeof(int) * descriptors.size();
             msg.msg_control = control;

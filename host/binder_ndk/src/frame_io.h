@@ -34,6 +34,10 @@ constexpr size_t kMaxBufferedBytesPerProcess = 64u << 20;
 // the descriptors of the frame arriving and of the one behind it, whose first byte the same read
 // may have taken.
 constexpr size_t kMaxReceivedDescriptors = 2 * kMaxDescriptorsPerFrame;
+// Room for the most descriptors one message can carry (the kernel's SCM_MAX_FD), so that a read
+// never truncates them: a truncated read leaves the rest open in this process under qemu-user,
+// and a peer that sends more than a frame may carry is then dropped with all of them closed.
+constexpr size_t kMaxDescriptorsPerMessage = 253;
 // Frames that a peer does not read at once wait in its connection, up to this much; a peer that
 // lets more pile up is dropped.
 constexpr size_t kMaxPendingSendBytes = 4u << 20;
