@@ -219,6 +219,31 @@ TEST_F(RingClientTest, EachSampleIsARecordInOrderWithItsEventAndBoottime) {
     DisableAndWait(handle_);
 }
 
+// Nothing waits for a reader: a ring that nobody reads is written around and around, and the
+// mode's other clients get their samples all the while.
+TEST_F(RingClientTest, ARingNobodyReadsHoldsNothingBack) {
+    MakeService();
+    ndk::ScopedFileDescriptor fd = OpenRing(3, 1);
+    RingMapping ring(fd.get());
+    ASSERT_NE(ring.header(), nullptr);
+    const int32_t poller = Open(3);
+    ASSERT_EQ(0, Enable(poller, 1));
+    const uint64_t lap = ring.header()->capacity + 16;
+    int polled = 0;
+    EXPECT_TRUE(WaitUntil(
+        [&] {
+            Event event;
+            if (Poll(poller, &event) == 0) ++polled;
+            return ring.last_seq() > lap;
+        },
+        kWait));
+    EXPECT_GT(polled, 0);
+    const uint64_t last = ring.last_seq();
+    EXPECT_EQ(ring.Read(last).seq, last);
+    DisableAndWait(poller);
+    DisableAndWait(handle_);
+}
+
 TEST_F(RingClientTest, EveryRingClientOfAModeMapsTheSameRing) {
     MakeService();
     ndk::ScopedFileDescriptor first = OpenRing(1, 50);
