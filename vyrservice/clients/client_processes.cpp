@@ -14,9 +14,8 @@ namespace android {
 namespace vyr {
 namespace binder {
 
-ClientProcesses::ClientProcesses(ClientProcessWatcher::OnExit on_exit,
-                                 ClientProcessWatcher::Syscalls syscalls)
-    : watcher_(std::make_unique<ClientProcessWatcher>(std::move(on_exit), syscalls)) {}
+ClientProcesses::ClientProcesses(ClientProcessWatcher::OnExit on_exit)
+    : watcher_(std::make_unique<ClientProcessWatcher>(std::move(on_exit))) {}
 
 void ClientProcesses::NoteCaller(ClientEntry::Users* users) {
     NoteProcess(users, AIBinder_getCallingPid());

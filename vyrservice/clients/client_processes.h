@@ -25,9 +25,7 @@ class ClientProcesses {
     using ClientTable = std::unordered_map<int32_t, std::shared_ptr<ClientEntry>>;
 
     // `on_exit` runs on the watcher's thread, once per watched process that ends.
-    explicit ClientProcesses(
-        ClientProcessWatcher::OnExit on_exit,
-        ClientProcessWatcher::Syscalls syscalls = ClientProcessWatcher::Syscalls::Real());
+    explicit ClientProcesses(ClientProcessWatcher::OnExit on_exit);
 
     // Adds the caller of the current binder method to the users of the entry.
     void NoteCaller(ClientEntry::Users* users);
