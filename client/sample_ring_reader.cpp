@@ -76,6 +76,11 @@ RingSample ToSample(const vyr_ring_record& record) {
     return sample;
 }
 
+// The bytes a ring of `capacity` records needs, without the overflow of a 32-bit size_t.
+uint64_t RingBytes(uint32_t capacity) {
+    return sizeof(vyr_ring_header) + uint64_t{capacity} * sizeof(vyr_ring_record);
+}
+
 // |a - b| without overflow, for a >= b.
 uint64_t Distance(int64_t a, int64_t b) {
     return static_cast<uint64_t>(a) - static_cast<uint64_t>(b);
@@ -138,14 +143,13 @@ bool SampleRingReader::CheckHeader(std::string* error) {
                  ", not %zu and %zu as layout version %u has them",
                  header->header_size, header->record_size, sizeof(vyr_ring_header),
                  sizeof(vyr_ring_record), VYR_RING_LAYOUT_VERSION);
-    } else if (header->capacity == 0 ||
-               header->capacity > (std::numeric_limits<size_t>::max() - sizeof(vyr_ring_header)) /
-                                      sizeof(vyr_ring_record)) {
+    } else if (header->capacity == 0) {
         snprintf(text, sizeof(text), "ring capacity of %" PRIu32 " records", header->capacity);
-    } else if (size_ < vyr_ring_bytes(header->capacity)) {
+    } else if (size_ < RingBytes(header->capacity)) {
+        // In 64 bits: what a 32-bit size_t would wrap, no mapping can hold anyway.
         snprintf(text, sizeof(text),
-                 "truncated ring: %zu bytes, where its %" PRIu32 " records need %zu", size_,
-                 header->capacity, vyr_ring_bytes(header->capacity));
+                 "truncated ring: %zu bytes, where its %" PRIu32 " records need %" PRIu64, size_,
+                 header->capacity, RingBytes(header->capacity));
     } else {
         header_ = header;
         records_ = static_cast<const char*>(address_) + sizeof(vyr_ring_header);

@@ -180,7 +180,7 @@ static inline binder_status_t AParcel_readNullableStrongBinder(const AParcel* pa
 // A ParcelFileDescriptor as the generated code passes it: the parcel keeps a duplicate, and a
 // read hands the caller a duplicate of its own. A required one may not be null.
 static inline binder_status_t AParcel_writeRequiredParcelFileDescriptor(
-        AParcel* parcel, const ScopedFileDescriptor& fd) {
+    AParcel* parcel, const ScopedFileDescriptor& fd) {
     if (fd.get() < 0) return STATUS_UNEXPECTED_NULL;
     return AParcel_writeParcelFileDescriptor(parcel, fd.get());
 }
@@ -196,7 +196,7 @@ static inline binder_status_t AParcel_readRequiredParcelFileDescriptor(const APa
 }
 
 static inline binder_status_t AParcel_writeNullableParcelFileDescriptor(
-        AParcel* parcel, const ScopedFileDescriptor& fd) {
+    AParcel* parcel, const ScopedFileDescriptor& fd) {
     return AParcel_writeParcelFileDescriptor(parcel, fd.get());
 }
 
