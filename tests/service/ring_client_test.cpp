@@ -13,6 +13,7 @@
 
 #include <csignal>
 #include <functional>
+#include <memory>
 
 #include "child_process.h"
 #include "sensor_doubles.h"
@@ -98,6 +99,14 @@ class RingClientTest : public ServiceFixture {
         return ring;
     }
 
+    // Makes the service and a ring client of `mode`, whose ring `ring_` maps.
+    void StartRing(int32_t mode, int32_t period) {
+        MakeService();
+        ring_fd_ = OpenRing(mode, period);
+        ring_ = std::make_unique<RingMapping>(ring_fd_.get());
+        ASSERT_NE(ring_->header(), nullptr);
+    }
+
     // Whether the ring goes past `seq` within the wait.
     static bool Advances(const RingMapping& ring, uint64_t seq) {
         return WaitUntil([&] { return ring.last_seq() > seq; }, kWait);
@@ -113,6 +122,8 @@ class RingClientTest : public ServiceFixture {
     }
 
     int32_t handle_ = 0;
+    ndk::ScopedFileDescriptor ring_fd_;
+    std::unique_ptr<RingMapping> ring_;
 };
 
 TEST_F(RingClientTest, UnknownAndEnabledHandlesGetEnablesAnswersAndNoRing) {
@@ -168,10 +179,8 @@ TEST_F(RingClientTest, TheDescriptorCanNeitherWriteNorGrowTheRing) {
 }
 
 TEST_F(RingClientTest, EachSampleIsARecordInOrderWithItsEventAndBoottime) {
-    MakeService();
-    ndk::ScopedFileDescriptor fd = OpenRing(3, 10);
-    RingMapping ring(fd.get());
-    ASSERT_NE(ring.header(), nullptr);
+    ASSERT_NO_FATAL_FAILURE(StartRing(3, 10));
+    const RingMapping& ring = *ring_;
     const vyr_ring_header& header = *ring.header();
     EXPECT_EQ(header.magic, VYR_RING_MAGIC);
     EXPECT_EQ(header.layout_version, VYR_RING_LAYOUT_VERSION);
@@ -222,10 +231,8 @@ TEST_F(RingClientTest, EachSampleIsARecordInOrderWithItsEventAndBoottime) {
 // Nothing waits for a reader: a ring that nobody reads is written around and around, and the
 // mode's other clients get their samples all the while.
 TEST_F(RingClientTest, ARingNobodyReadsHoldsNothingBack) {
-    MakeService();
-    ndk::ScopedFileDescriptor fd = OpenRing(3, 1);
-    RingMapping ring(fd.get());
-    ASSERT_NE(ring.header(), nullptr);
+    ASSERT_NO_FATAL_FAILURE(StartRing(3, 1));
+    const RingMapping& ring = *ring_;
     const int32_t poller = Open(3);
     ASSERT_EQ(0, Enable(poller, 1));
     const uint64_t lap = ring.header()->capacity + 16;
