@@ -130,6 +130,15 @@ TEST_F(ServiceAcrossProcessesTest, TheDeathOfAClientReleasesItsHandle) {
     EXPECT_TRUE(Eventually([&] { return Poll(handle) == -EINVAL; })) << "the handle outlived it";
 }
 
+// The binding is of the newest frozen version, which a client asks for before it uses a method
+// of that version.
+TEST_F(ServiceAcrossProcessesTest, TheServiceReportsInterfaceVersion3) {
+    int32_t version = 0;
+    ASSERT_TRUE(service_->getInterfaceVersion(&version).isOk());
+    EXPECT_EQ(version, 3);
+    EXPECT_EQ(int32_t{IVYRService::version}, 3);
+}
+
 // A ring client reads every sample the service stores, in order, from shared memory: the frames
 // of the doubles are numbered by their time, one apart.
 TEST_F(ServiceAcrossProcessesTest, ARingClientReadsEverySampleInOrderWithNoCallPerSample) {
